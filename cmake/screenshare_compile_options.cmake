@@ -1,0 +1,48 @@
+# SPDX-License-Identifier: Apache-2.0
+# How everything in this project is compiled, whatever the target.
+
+set(CMAKE_CXX_STANDARD 20)
+set(CMAKE_CXX_STANDARD_REQUIRED ON)
+set(CMAKE_CXX_EXTENSIONS OFF)
+
+# We live inside other people's processes: what is not exported by name stays invisible to them.
+set(CMAKE_CXX_VISIBILITY_PRESET hidden)
+set(CMAKE_VISIBILITY_INLINES_HIDDEN ON)
+set(CMAKE_POSITION_INDEPENDENT_CODE ON)
+
+add_compile_options(-Wall -Wextra -Wpedantic -Wshadow -Wconversion)
+if(CMAKE_CXX_COMPILER_ID MATCHES "Clang")
+    # clang counts sign changes to -Wconversion, g++ does not; one rule for both.
+    add_compile_options(-Wno-sign-conversion)
+endif()
+
+if(CMAKE_CXX_COMPILER_ID STREQUAL "GNU" AND CMAKE_CXX_COMPILER_VERSION VERSION_GREATER_EQUAL 12)
+    # Otherwise an atomic member behind a pointer that is compared with null somewhere counts as an overflow.
+    add_compile_options(--param=min-pagesize=0)
+endif()
+
+# Trace lines name their source place from the project root, on whatever machine they were built.
+add_compile_options(-ffile-prefix-map=${PROJECT_SOURCE_DIR}/=)
+
+if(SCREENSHARE_SANITIZE STREQUAL "address")
+    set(sanitizer_options -fsanitize=address,undefined,float-cast-overflow -fno-sanitize-recover=all)
+elseif(SCREENSHARE_SANITIZE STREQUAL "thread")
+    set(sanitizer_options -fsanitize=thread)
+elseif(SCREENSHARE_SANITIZE)
+    message(FATAL_ERROR "SCREENSHARE_SANITIZE is '${SCREENSHARE_SANITIZE}': expected 'address', 'thread' or nothing")
+endif()
+if(SCREENSHARE_SANITIZE)
+    add_compile_options(${sanitizer_options} -fno-omit-frame-pointer)
+    add_link_options(${sanitizer_options})
+endif()
+
+if(SCREENSHARE_FUZZ)
+    # Coverage feedback for the whole library; the fuzzers themselves add the driver.
+    add_compile_options(-fsanitize=fuzzer-no-link)
+endif()
+
+find_program(SCREENSHARE_CCACHE_PROGRAM ccache)
+mark_as_advanced(SCREENSHARE_CCACHE_PROGRAM)
+if(SCREENSHARE_CCACHE AND SCREENSHARE_CCACHE_PROGRAM)
+    set(CMAKE_CXX_COMPILER_LAUNCHER ${SCREENSHARE_CCACHE_PROGRAM})
+endif()
