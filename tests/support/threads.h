@@ -1,0 +1,150 @@
+// SPDX-License-Identifier: Apache-2.0
+#pragma once
+
+#include "util/cm_clock.h"
+#include "util/cm_thread.h"
+
+#include <gtest/gtest.h>
+
+#include <pthread.h>
+
+#include <chrono>
+#include <condition_variable>
+#include <cstddef>
+#include <filesystem>
+#include <functional>
+#include <iterator>
+#include <memory>
+#include <mutex>
+#include <thread>
+#include <utility>
+
+/// How long a test waits, in real time, for what another thread must do. Only a failing test ever waits so
+/// long.
+inline constexpr std::chrono::seconds PATIENCE{30};
+
+/// Puts a manual clock in force for the length of a scope. Make it before the threads that it is to rule.
+class CManualClockScope {
+public:
+    CManualClockScope() : m_former(CmReplaceClock(&m_clock)) {}
+    ~CManualClockScope() { CmReplaceClock(m_former); }
+    CManualClockScope(const CManualClockScope&) = delete;
+    CManualClockScope& operator=(const CManualClockScope&) = delete;
+
+    CCmManualClock* operator->() { return &m_clock; }
+
+private:
+    CCmManualClock m_clock;
+    ICmClock* const m_former;
+};
+
+/// A number that some threads raise and others wait for. Threads: any.
+class CTally {
+public:
+    void Add() {
+        const std::lock_guard<std::mutex> lock(m_mutex);
+        ++m_count;
+        m_changed.notify_all();
+    }
+
+    int Count() const {
+        const std::lock_guard<std::mutex> lock(m_mutex);
+        return m_count;
+    }
+
+    /// False when the count is still lower after PATIENCE.
+    [[nodiscard]] bool Reaches(int count) const {
+        std::unique_lock<std::mutex> lock(m_mutex);
+        return m_changed.wait_for(lock, PATIENCE, [&] { return m_count >= count; });
+    }
+
+private:
+    mutable std::mutex m_mutex;
+    mutable std::condition_variable m_changed;
+    int m_count = 0;
+};
+
+/// Holds threads back until it is opened, but not for ever. Threads: any.
+class CGate {
+public:
+    void Open() { m_opened.Add(); }
+    [[nodiscard]] bool Passes() const { return m_opened.Reaches(1); }
+
+private:
+    CTally m_opened;
+};
+
+/// A function as an event that is not fired yet; the queue that takes it owns it.
+inline ICmEvent* NewEvent(std::function<void()> fn) {
+    return new CCmInvokeEvent<std::function<void()>>(std::move(fn));
+}
+
+inline int Post(ACmThread& thread, std::function<void()> fn, int priority = CM_EVENT_PRIORITY_NORMAL) {
+    return thread.GetEventQueue()->PostEvent(NewEvent(std::move(fn)), priority);
+}
+
+inline int Send(ACmThread& thread, std::function<void()> fn) {
+    return thread.GetEventQueue()->SendEvent(NewEvent(std::move(fn)));
+}
+
+/// Comes back when the thread has fired the events and run the ticks that were due when it was called.
+inline void Settle(ACmThread& thread) {
+    ASSERT_EQ(Send(thread, [] {}), 0);
+}
+
+/// A running task thread, stopped and joined at the end of the scope.
+class CRunningThread {
+public:
+    explicit CRunningThread(const char* name = "test")
+        : m_thread(std::make_shared<KRNUTIL::ComTaskThread>()) {
+        EXPECT_EQ(m_thread->Create(name, 1, 1), 0);
+    }
+    ~CRunningThread() { EXPECT_EQ(m_thread->Destory(0), 0); }
+    CRunningThread(const CRunningThread&) = delete;
+    CRunningThread& operator=(const CRunningThread&) = delete;
+
+    KRNUTIL::ComTaskThread& operator*() const { return *m_thread; }
+    KRNUTIL::ComTaskThread* operator->() const { return m_thread.get(); }
+    const std::shared_ptr<KRNUTIL::ComTaskThread>& Share() const { return m_thread; }
+
+private:
+    const std::shared_ptr<KRNUTIL::ComTaskThread> m_thread;
+};
+
+/// While it lives, the process has no room for the stack of another thread: none can be started.
+class CNoNewThreadsScope {
+public:
+    CNoNewThreadsScope() {
+        pthread_getattr_default_np(&m_before);
+        pthread_attr_t huge;
+        pthread_attr_init(&huge);
+        pthread_attr_setstacksize(&huge, std::size_t{1} << 47);
+        EXPECT_EQ(pthread_setattr_default_np(&huge), 0);
+        pthread_attr_destroy(&huge);
+    }
+    ~CNoNewThreadsScope() {
+        pthread_setattr_default_np(&m_before);
+        pthread_attr_destroy(&m_before);
+    }
+    CNoNewThreadsScope(const CNoNewThreadsScope&) = delete;
+    CNoNewThreadsScope& operator=(const CNoNewThreadsScope&) = delete;
+
+private:
+    pthread_attr_t m_before;
+};
+
+/// How many threads the operating system counts in this process; a sanitizer's own ones are among them.
+inline std::ptrdiff_t CountThreadsOfProcess() {
+    return std::distance(std::filesystem::directory_iterator("/proc/self/task"), {});
+}
+
+/// A joined thread may stay in the system's list for a moment. Gives the count that it found last.
+inline std::ptrdiff_t WaitForThreadsOfProcess(std::ptrdiff_t count) {
+    const auto deadline = std::chrono::steady_clock::now() + PATIENCE;
+    std::ptrdiff_t found = CountThreadsOfProcess();
+    while (found != count && std::chrono::steady_clock::now() < deadline) {
+        std::this_thread::yield();
+        found = CountThreadsOfProcess();
+    }
+    return found;
+}
