@@ -1,0 +1,383 @@
+// SPDX-License-Identifier: Apache-2.0
+#pragma once
+
+#include "platform/core_types.h"
+
+#include <sys/types.h>
+#include <chrono>
+#include <cstddef>
+#include <cstdint>
+#include <memory>
+#include <string>
+#include <vector>
+
+/// The narrow interface between the library and a window server. Whoever brings a new kind of desktop
+/// implements WindowServer and nothing else; tests/platform/conformance_test states this contract once and
+/// runs it on each.
+///
+/// What is written here once, and holds for every operation:
+///
+/// Threads    Any operation may be called from any thread at any time, several at once, in any state of the
+///            server. An implementation may own one thread; that thread never calls out except into the
+///            NoticeReceiver.
+/// Waiting    Look-ups (displays, snapshot, pointer, cursor, applications, life, capabilities) answer from
+///            what the server knows already and never wait for the desktop. Operations that do wait have a
+///            deadline and fail when it passes; the server then counts as stalled until it answers again.
+///            Nothing holds a lock that a notice needs while it waits.
+/// Answers    A call on a dead, stalled or unfinished server is normal and gives the failure value. No
+///            operation throws, ends the process, raises a signal or spins.
+/// Results    What is given out is immutable and shared: it stays as it was while somebody holds it,
+///            however the desktop goes on, and outlives the server itself.
+/// Units      Points (platform/core_types.h) for places on the desktop, pixels for pictures, the monotonic
+///            clock (CmSteadyNow) for times.
+/// Forking    Every descriptor is close-on-exec; no lock is held over a fork; own threads block all signals.
+namespace platform {
+
+// ---- What a server can do
+
+enum class Capability {
+    Windows,      ///< A list of windows; without it there is one window a display, see WindowSnapshot.
+    WindowImages, ///< Pictures of chosen windows.
+    Streams,      ///< Streams of a display as seen.
+    Pointer,      ///< The pointer's position.
+    Cursor,       ///< The pointer's image.
+    Applications, ///< Running applications.
+    Activation,   ///< Bringing an application to the front.
+};
+
+enum class Availability {
+    No,
+    Yes,
+    AfterPermission
+};
+
+enum class Permission {
+    NotNeeded,
+    NotAsked,
+    Asking,
+    Granted,
+    Denied
+};
+
+enum class Life {
+    Alive,
+    Stalled, ///< A deadline has passed and the server has not answered since.
+    Lost,    ///< The connection is gone, or there never was one. It may come back.
+};
+
+struct LifeState {
+    Life life = Life::Lost;
+    /// Grows each time the server is found anew; what was opened under an earlier epoch is dead.
+    std::uint64_t epoch = 0;
+
+    bool operator==(const LifeState&) const = default;
+};
+
+// ---- Displays
+
+struct DisplayInfo {
+    /// The same for the same monitor, also after it was unplugged and plugged in again, after displays
+    /// changed their order, and after the server was lost and found.
+    CGDirectDisplayID id = 0;
+    CGRect bounds;
+    /// Bounds less the edges that menu bars, panels and docks have reserved.
+    CGRect visibleBounds;
+    /// Pixels per point.
+    float scale = 1.0F;
+    /// UTF-8; never empty.
+    std::string productName;
+};
+
+/// The main display first, the others in an order that only changes with the layout.
+using DisplayList = std::vector<DisplayInfo>;
+
+/// What happened to a display; several may come in one notice.
+enum DisplayChangeFlags : unsigned {
+    DisplayBeginConfiguration = 1u << 0,
+    DisplayMoved = 1u << 1,
+    DisplaySetMain = 1u << 2,
+    DisplaySetMode = 1u << 3,
+    DisplayAdded = 1u << 4,
+    DisplayRemoved = 1u << 5,
+    DisplayEnabled = 1u << 8,
+    DisplayDisabled = 1u << 9,
+    DisplayDesktopShapeChanged = 1u << 12, ///< Its size, or the arrangement, changed.
+};
+
+// ---- Windows
+
+enum class SharingState {
+    None, ///< Its pixels are never given out.
+    ReadOnly,
+    ReadWrite,
+};
+
+struct WindowInfo {
+    CGWindowID id = 0;
+    pid_t owner = 0; ///< 0 when it can't be told.
+    /// Height in the stack's storeys: 0 for normal windows, negative for the desktop's own, higher ones for
+    /// what floats above (dock, menus, panels; the levels of CGWindowLevelForKey).
+    int level = 0;
+    float alpha = 1.0F; ///< 0 fully transparent to 1 opaque, for the window as a whole.
+    CGRect frame;       ///< The visible frame: decorations in, shadows out.
+    SharingState sharing = SharingState::ReadOnly;
+    bool onScreen = true; ///< Mapped and neither minimised nor on another workspace.
+    std::string title;    ///< UTF-8, perhaps empty; text that is no UTF-8 is mended, never passed on.
+};
+
+/// All windows of one moment.
+class WindowSnapshot {
+public:
+    WindowSnapshot() = default;
+    /// `frontFirst` holds the windows from the front of the stack to its back.
+    WindowSnapshot(std::uint64_t generation, std::vector<WindowInfo> frontFirst);
+
+    /// Grows with every change of stack, frame, mapping or alpha, so equal generations mean an equal picture
+    /// of who covers whom. Never 0 on a server that is alive.
+    std::uint64_t Generation() const { return m_generation; }
+    const std::vector<WindowInfo>& Windows() const { return m_windows; }
+    /// Null for a window that is not in this snapshot.
+    const WindowInfo* Find(CGWindowID id) const;
+
+private:
+    std::uint64_t m_generation = 0;
+    std::vector<WindowInfo> m_windows;
+    std::vector<std::pair<CGWindowID, std::size_t>> m_index; // sorted by id
+};
+
+// ---- Pictures
+
+/// Bytes in memory order, byte 0 first; in the last one, the bits of a little-endian 32-bit word, high ones
+/// first.
+enum class PixelFormat {
+    BGRX,
+    BGRA, ///< Premultiplied.
+    RGBX,
+    RGBA, ///< Premultiplied.
+    X2R10G10B10,
+};
+
+/// Pixels of a picture; right and bottom exclusive.
+struct PixelRect {
+    int left = 0;
+    int top = 0;
+    int right = 0;
+    int bottom = 0;
+
+    bool operator==(const PixelRect&) const = default;
+};
+
+/// One block of pixels, pinned while held: nobody writes to it any more.
+struct Picture {
+    int width = 0;
+    int height = 0;
+    std::size_t stride = 0; ///< Bytes from one row to the next, at least width * 4.
+    PixelFormat format = PixelFormat::BGRX;
+    const std::uint8_t* pixels =
+        nullptr;        ///< First byte of the top row; never null in a picture that is given out.
+    CGRect rect;        ///< What the picture shows, in points.
+    float scale = 1.0F; ///< Pixels per point.
+    std::chrono::nanoseconds time{0}; ///< When the desktop looked like this.
+    /// What is different from the picture that the same asker had before; the whole picture when there was
+    /// none.
+    std::vector<PixelRect> changed;
+    /// Generations of the snapshot before and after the pixels were fetched. When they are equal, the picture
+    /// shows that snapshot.
+    std::uint64_t generationBefore = 0;
+    std::uint64_t generationAfter = 0;
+    std::shared_ptr<const void> memory; ///< Keeps `pixels`.
+};
+
+using PicturePtr = std::shared_ptr<const Picture>;
+
+/// One window's part in a window picture.
+struct PictureLayer {
+    CGWindowID window = 0;
+    PicturePtr picture;
+    CGRect frame;       ///< Where it lies, in points.
+    float alpha = 1.0F; ///< To be multiplied into its pixels.
+    /// Not of this moment: the last picture of a window that has none now, as when it is minimised.
+    bool stale = false;
+};
+
+/// A picture of chosen windows: their own pictures, back to front, all of one moment. What no layer covers is
+/// empty.
+struct WindowPicture {
+    std::vector<PictureLayer> layers;
+    std::chrono::nanoseconds time{0};
+    std::uint64_t generation = 0; ///< The snapshot whose stack it shows.
+};
+
+enum class PictureOutcome {
+    Ok,
+    Nothing,     ///< Nothing new since this reader's last picture.
+    Stale,       ///< The stack kept changing under the fetch; no picture. Asking again may help.
+    Gone,        ///< None of the windows, or not the display, exists any more.
+    Timeout,     ///< The deadline passed.
+    Unsupported, ///< This server can't, or not with what has been kept out.
+    Refused,     ///< Permission is missing.
+    Failed,      ///< Anything else; the server has traced why.
+};
+
+struct WindowPictureResult {
+    PictureOutcome outcome = PictureOutcome::Failed;
+    std::shared_ptr<const WindowPicture> picture; ///< Null unless Ok.
+};
+
+struct DisplayPictureResult {
+    PictureOutcome outcome = PictureOutcome::Failed;
+    PicturePtr picture; ///< Null unless Ok.
+};
+
+enum WindowPictureOptions : unsigned {
+    WindowPictureDefault = 0,             ///< With what the server draws around the frame, such as shadows.
+    WindowPictureBoundsIgnoreFraming = 1, ///< The frames only.
+};
+
+/// What TakeWindowPicture is asked for.
+struct WindowPictureRequest {
+    std::vector<CGWindowID> windows; ///< In any order; unknown ones are left out.
+    CGRect rect;                     ///< What will be looked at, in points; the server need not fetch more.
+    unsigned options = WindowPictureBoundsIgnoreFraming;
+    /// Give up at this time. DEFAULT_IMAGE_DEADLINE from now is what callers use.
+    std::chrono::nanoseconds deadline{0};
+};
+
+/// What OpenDisplayStream is asked for.
+struct DisplayStreamRequest {
+    CGDirectDisplayID display = 0;
+    unsigned framesPerSecond =
+        30; ///< At most so many pictures a second; the pictures are as seen, not per change.
+    bool withPointer = false; ///< Draw the pointer in.
+};
+
+/// A reader of a display as it is seen. Several readers of one display each have their own changes.
+/// Threads:  one at a time.
+/// Lifetime: destroying it closes it; no StreamPicture notice of it comes after that. It outlives neither
+///           its epoch (it then answers Gone) nor harms anybody by being kept.
+class DisplayStream {
+public:
+    virtual ~DisplayStream() = default;
+
+    /// The newest picture, with what changed since this reader's last one; Nothing when nothing did. Doesn't
+    /// wait for a change.
+    virtual DisplayPictureResult TakeNewest(std::chrono::nanoseconds deadline) = 0;
+};
+
+// ---- Pointer and cursor
+
+/// The pointer's image, in one or more resolutions of the same thing.
+struct CursorImage {
+    std::uint64_t serial = 0;                ///< Another one whenever the image is another one.
+    CGPoint hotSpot;                         ///< Points from the image's top left.
+    std::vector<PicturePtr> representations; ///< BGRA or RGBA; at least one.
+};
+
+// ---- Applications
+
+enum class ApplicationKind {
+    Ordinary,
+    Other, ///< A process that shows windows without being something that people start.
+};
+
+struct ApplicationInfo {
+    pid_t pid = 0;
+    std::string name;     ///< For people, UTF-8; never empty.
+    std::string fileName; ///< Of the program, without its folder.
+    ApplicationKind kind = ApplicationKind::Ordinary;
+    bool backgroundOnly = false;
+};
+
+using ApplicationList = std::vector<ApplicationInfo>;
+
+// ---- Notices
+
+enum class NoticeKind {
+    DisplayChanged,      ///< `display`, `flags`. The lists already tell the new state.
+    ApplicationLaunched, ///< `pid`
+    ApplicationEnded,    ///< `pid`; only when the process has ended, and once.
+    PermissionChanged,
+    LifeChanged,
+    StreamPicture, ///< `stream`: there is something new for that reader. Not repeated until it has taken a
+                   ///< picture.
+};
+
+struct Notice {
+    NoticeKind kind = NoticeKind::LifeChanged;
+    CGDirectDisplayID display = 0;
+    unsigned flags = 0;
+    pid_t pid = 0;
+    const DisplayStream* stream = nullptr; ///< To be compared only.
+};
+
+/// Takes notices in. It only queues them, so a server may call it under its own locks and from any of its
+/// threads, in the order in which things happened. The layer above delivers them later, on a thread of its
+/// own.
+class NoticeReceiver {
+public:
+    virtual ~NoticeReceiver() = default;
+    virtual void OnNotice(const Notice& notice) = 0;
+};
+
+// ---- The server
+
+/// How long callers let a server take over a picture.
+inline constexpr std::chrono::nanoseconds DEFAULT_IMAGE_DEADLINE = std::chrono::seconds(1);
+/// How long a server may take to connect.
+inline constexpr std::chrono::nanoseconds DEFAULT_CONNECT_DEADLINE = std::chrono::seconds(2);
+
+class WindowServer {
+public:
+    virtual ~WindowServer() = default;
+
+    /// "none", "simulated", "x11": the word of SCREENSHARE_PLATFORM.
+    virtual const char* Name() const = 0;
+
+    // Life and rights.
+    virtual LifeState GetLife() const = 0;
+    virtual Availability GetCapability(Capability capability) const = 0;
+    virtual Permission GetPermission() const = 0;
+    /// Asks the user, where there is somebody to ask, and returns at once; PermissionChanged tells the
+    /// answer.
+    virtual void AskPermission() = 0;
+
+    /// Where notices go, null for nowhere. After it has returned, the old receiver gets nothing more.
+    virtual void SetNoticeReceiver(std::shared_ptr<NoticeReceiver> receiver) = 0;
+
+    // Look-ups: never null, empty when there is nothing or the server is lost.
+    virtual std::shared_ptr<const DisplayList> GetDisplays() const = 0;
+    virtual std::shared_ptr<const WindowSnapshot> GetWindows() const = 0;
+    virtual std::shared_ptr<const ApplicationList> GetApplications() const = 0;
+
+    /// False when the position is not known; `position` then stays as it was.
+    virtual bool GetPointerPosition(CGPoint& position) const = 0;
+    /// Null when there is no image. The same object as long as the serial is the same.
+    virtual std::shared_ptr<const CursorImage> GetCursor() const = 0;
+
+    // Pictures.
+    /// One picture of the listed windows and of nothing else: never a pixel of a window that is not listed,
+    /// of one whose sharing state is None, or of what lay behind a window before it had painted itself. A
+    /// picture that can't be had in that purity is not given.
+    ///
+    /// A server without Capability::Windows lists one window a display, whose picture is the display as seen;
+    /// asked for less than all of them it answers Unsupported.
+    virtual WindowPictureResult TakeWindowPicture(const WindowPictureRequest& request) = 0;
+
+    /// Null when the display doesn't exist or streams are not to be had.
+    virtual std::unique_ptr<DisplayStream> OpenDisplayStream(const DisplayStreamRequest& request) = 0;
+
+    /// Brings all windows of a process to the front, in their order. False when there is none or it can't be
+    /// done.
+    virtual bool BringToFront(pid_t pid) = 0;
+};
+
+/// The window server in force; never null. Chosen at the first call by the environment variable
+/// SCREENSHARE_PLATFORM (auto, x11, simulated, none), where what can't be had means none. A simulated desktop
+/// is never chosen by itself.
+std::shared_ptr<WindowServer> CurrentWindowServer();
+
+/// Puts another one in force and gives the one that was; null means to choose anew at the next call. For
+/// tests and scenes.
+std::shared_ptr<WindowServer> ReplaceWindowServer(std::shared_ptr<WindowServer> server);
+
+} // namespace platform
