@@ -1,0 +1,93 @@
+// SPDX-License-Identifier: Apache-2.0
+#pragma once
+
+#include "util/qvn_unknown_impl.h"
+
+#include <screenshare/share_frame.h>
+
+#include <cstdint>
+#include <memory>
+
+/// The frame that the library itself fills, keeps and hands out.
+///
+/// Lifetime: built with a reference count of 0; its creator calls AddRef at once. Memory:   grows with the
+///           geometry, keeps no picture across a growth, never shrinks. New memory is zeroed: nobody sees
+///           what the heap held before. No operation leaves memory that the frame owns, whatever the
+///           geometry says; of attached memory the attached length is believed. Lengths:  32-bit signed and
+///           wrapping, as clients see them.
+/// Threads:  one at a time; only the reference count is atomic.
+/// Errors:   an allocation that fails throws std::bad_alloc out of the operation that set the geometry. The
+///           geometry is stored then, the frame has no pixels, and the next setter tries again.
+class CShareFrame : public IShareFrame, public qvn::CQvnUnknownImpl {
+public:
+    CShareFrame() = default;
+
+    unsigned AddRef() override { return AddRefImpl(); }
+    unsigned Release() override { return ReleaseImpl(); }
+    int QueryInterface(const qvn::_tagUUID& iid, void** object) override {
+        return QueryInterfaceImpl(iid, object);
+    }
+    unsigned GetReference() override { return GetReferenceImpl(); }
+
+    int SetExternalBuf(unsigned char* buf, int len) override;
+
+    void SetTimestamp(unsigned timestamp) override { m_nTimestamp = timestamp; }
+    unsigned GetTimestamp() override { return m_nTimestamp; }
+
+    unsigned char* GetFrameData() override { return _BufferInForce(); }
+    unsigned char* GetFrameLineData(int line) override;
+    int GetFrameDataLen() override { return _GetFrameDataLen(); }
+    int GetFrameLineBytes() override { return _GetLineByteLen(); }
+
+    int SetFrameLineBytes(int bytes) override;
+    SHARE_FRAME_FORMAT SetFrameDataFormat(SHARE_FRAME_FORMAT format) override;
+    SHARE_FRAME_FORMAT GetFrameDataFormat() override { return m_eFormat; }
+    int GetFrameSize(int& width, int& height) override;
+    int GetFrameSize(TVLSize& size) override { return GetFrameSize(size.cx, size.cy); }
+    int SetFrameSize(int width, int height) override;
+    int SetFrameSize(TVLSize size) override { return SetFrameSize(size.cx, size.cy); }
+
+    int WriteFrameData(const unsigned char* data, int len) override;
+    int WriteFrameLineData(int line, const unsigned char* data, int len) override;
+    int WriteFrameAreaData(TVLRect& rect, const unsigned char* data, int len) override;
+    int ReadFrameData(unsigned char* data, int len) override;
+    int ReadFrameLineData(int line, unsigned char* data, int len) override;
+    int ReadFrameAreaData(TVLRect& rect, unsigned char* data, int len) override;
+
+    int CopyIShareFrame(IShareFrame* source) override;
+    int SwapOrCopy(IShareFrame* other) override;
+    void Reset() override { m_nLineBytes = 0; }
+
+    void SetMetaInfo(const MetaInfo& info) override { m_metaInfo = info; }
+    MetaInfo GetMetaInfo() const override { return m_metaInfo; }
+
+protected:
+    ~CShareFrame() override = default;
+
+private:
+    bool _ExpandFrameData();
+    unsigned char* _BufferInForce() const;
+    int _GetLineByteLen() const;
+    int _GetFrameDataLen() const;
+    bool _IsEmptyFrame() const { return m_nHeight < 1 || m_nWidth < 1; }
+    bool _CanSetExternalLineLen() const { return true; }
+    bool _IsRectInFrame(const TVLRect& rect) const;
+    bool _ExceedsOwnBuf(int len) const { return m_pOwnBuf != nullptr && len > m_nBufLen; }
+    void _SwapFields(CShareFrame& other);
+
+    /// Moves a rectangle between the frame and the dense rows of `data`, which is only read unless `bRead`.
+    int _FrameAreaDataIO(TVLRect rect, unsigned char* data, int len, bool bRead);
+
+    int m_nWidth = 0;
+    int m_nHeight = 0;
+    std::unique_ptr<unsigned char[]> m_pOwnBuf;
+    /// The client's memory; takes precedence over ours.
+    unsigned char* m_pExternalBuf = nullptr;
+    /// Bytes of the buffer in force, exactly so when that is ours. A detached buffer leaves its length here.
+    int m_nBufLen = 0;
+    /// 0 when the width and the format tell it.
+    int m_nLineBytes = 0;
+    SHARE_FRAME_FORMAT m_eFormat = SHARE_FRAME_FORMAT_NONE;
+    std::uint32_t m_nTimestamp = 0;
+    MetaInfo m_metaInfo{};
+};
