@@ -9,6 +9,7 @@
 #include <cstdint>
 #include <memory>
 #include <string>
+#include <utility>
 #include <vector>
 
 /// The narrow interface between the library and a window server. Whoever brings a new kind of desktop
@@ -18,19 +19,23 @@
 /// What is written here once, and holds for every operation:
 ///
 /// Threads    Any operation may be called from any thread at any time, several at once, in any state of the
-///            server. An implementation may own one thread; that thread never calls out except into the
-///            NoticeReceiver.
+///            server. An implementation may own one thread, besides those that a library it needs starts;
+///            none of them calls out except into the NoticeReceiver, all are joined with it, and all block
+///            every signal.
 /// Waiting    Look-ups (displays, snapshot, pointer, cursor, applications, life, capabilities) answer from
 ///            what the server knows already and never wait for the desktop. Operations that do wait have a
 ///            deadline and fail when it passes; the server then counts as stalled until it answers again.
-///            Nothing holds a lock that a notice needs while it waits.
+///            Nothing holds a lock that a notice needs while it waits. Deadlines are absolute, on
+///            CmSteadyNow; one that has passed, such as the default, gives Timeout. Threads wait on a
+///            CCmWaitPoint, so that a clock that is moved by hand moves them.
 /// Answers    A call on a dead, stalled or unfinished server is normal and gives the failure value. No
 ///            operation throws, ends the process, raises a signal or spins.
 /// Results    What is given out is immutable and shared: it stays as it was while somebody holds it,
 ///            however the desktop goes on, and outlives the server itself.
 /// Units      Points (platform/core_types.h) for places on the desktop, pixels for pictures, the monotonic
 ///            clock (CmSteadyNow) for times.
-/// Forking    Every descriptor is close-on-exec; no lock is held over a fork; own threads block all signals.
+/// Forking    Every descriptor is close-on-exec; no lock is held over a fork. In a forked child a server is
+///            Lost for good, touches no descriptor and waits for no thread; destroying it there only forgets.
 namespace platform {
 
 // ---- What a server can do
@@ -61,8 +66,11 @@ enum class Permission {
 
 enum class Life {
     Alive,
-    Stalled, ///< A deadline has passed and the server has not answered since.
-    Lost,    ///< The connection is gone, or there never was one. It may come back.
+    /// A deadline has passed and the server has not answered since. Operations that wait fail at once,
+    /// look-ups give the last state; the server itself finds out when it answers again.
+    Stalled,
+    /// The connection is gone, or there never was one. Look-ups give nothing. It may come back.
+    Lost,
 };
 
 struct LifeState {
@@ -91,7 +99,9 @@ struct DisplayInfo {
 /// The main display first, the others in an order that only changes with the layout.
 using DisplayList = std::vector<DisplayInfo>;
 
-/// What happened to a display; several may come in one notice.
+/// What happened to a display; several may come in one notice. A server tells what has happened and never
+/// DisplayBeginConfiguration: the layer above adds the call before. A loss is LifeChanged and then
+/// DisplayRemoved for each display, a return LifeChanged and then DisplayAdded. Mirrored displays are one.
 enum DisplayChangeFlags : unsigned {
     DisplayBeginConfiguration = 1u << 0,
     DisplayMoved = 1u << 1,
@@ -113,8 +123,8 @@ enum class SharingState {
 };
 
 struct WindowInfo {
-    CGWindowID id = 0;
-    pid_t owner = 0; ///< 0 when it can't be told.
+    CGWindowID id = 0; ///< Never means another window later; when ids run out, the window is not listed.
+    pid_t owner = 0;   ///< 0 when it can't be told.
     /// Height in the stack's storeys: 0 for normal windows, negative for the desktop's own, higher ones for
     /// what floats above (dock, menus, panels; the levels of CGWindowLevelForKey).
     int level = 0;
@@ -125,15 +135,21 @@ struct WindowInfo {
     std::string title;    ///< UTF-8, perhaps empty; text that is no UTF-8 is mended, never passed on.
 };
 
-/// All windows of one moment.
+/// All windows of one moment; those that are off the screen stand where the server's stack has them, else at
+/// the back. The order of the list, and not the level, tells who covers whom.
+///
+/// A window enters a snapshot only when its owner, level and sharing state have been found out, or can't be:
+/// one whose owner is not known yet would pass for a window of nobody. The generation has grown from its
+/// mapping on, and no snapshot of that generation is given out before.
 class WindowSnapshot {
 public:
     WindowSnapshot() = default;
     /// `frontFirst` holds the windows from the front of the stack to its back.
     WindowSnapshot(std::uint64_t generation, std::vector<WindowInfo> frontFirst);
 
-    /// Grows with every change of stack, frame, mapping or alpha, so equal generations mean an equal picture
-    /// of who covers whom. Never 0 on a server that is alive.
+    /// Grows with every change of stack, frame, mapping, level, owner, sharing state or alpha, so equal
+    /// generations mean an equal picture of who covers whom. Never goes back, also not over a loss; those of
+    /// two servers can't be compared. Never 0 on a server that is alive.
     std::uint64_t Generation() const { return m_generation; }
     const std::vector<WindowInfo>& Windows() const { return m_windows; }
     /// Null for a window that is not in this snapshot.
@@ -178,11 +194,13 @@ struct Picture {
     CGRect rect;        ///< What the picture shows, in points.
     float scale = 1.0F; ///< Pixels per point.
     std::chrono::nanoseconds time{0}; ///< When the desktop looked like this.
-    /// What is different from the picture that the same asker had before; the whole picture when there was
-    /// none.
+    /// Of a stream: what is different from this reader's picture before, perhaps more and never less; the
+    /// whole picture at first. A layer tells nothing here: its picture is the same object as long as the
+    /// window's pixels are the same.
     std::vector<PixelRect> changed;
-    /// Generations of the snapshot before and after the pixels were fetched. When they are equal, the picture
-    /// shows that snapshot.
+    /// Of a display: the generation of the oldest stack that the pixels may still show (where a compositor
+    /// lags behind the stack, the one in force a settle time ago), and the generation after the fetch. Only
+    /// when both are equal does the picture show that snapshot. Not used in a layer.
     std::uint64_t generationBefore = 0;
     std::uint64_t generationAfter = 0;
     std::shared_ptr<const void> memory; ///< Keeps `pixels`.
@@ -210,6 +228,7 @@ struct WindowPicture {
 
 enum class PictureOutcome {
     Ok,
+    Lost,        ///< The server is lost or stalled. Not traced for each call.
     Nothing,     ///< Nothing new since this reader's last picture.
     Stale,       ///< The stack kept changing under the fetch; no picture. Asking again may help.
     Gone,        ///< None of the windows, or not the display, exists any more.
@@ -236,7 +255,10 @@ enum WindowPictureOptions : unsigned {
 
 /// What TakeWindowPicture is asked for.
 struct WindowPictureRequest {
-    std::vector<CGWindowID> windows; ///< In any order; unknown ones are left out.
+    /// Whether the asker keeps out anything, listed or not. A server without Capability::Windows then answers
+    /// Unsupported: the picture of a whole display would show it.
+    bool keepsOut = true;
+    std::vector<CGWindowID> windows; ///< In any order; unknown ones are left out, doubled ones count once.
     CGRect rect;                     ///< What will be looked at, in points; the server need not fetch more.
     unsigned options = WindowPictureBoundsIgnoreFraming;
     /// Give up at this time. DEFAULT_IMAGE_DEADLINE from now is what callers use.
@@ -253,15 +275,24 @@ struct DisplayStreamRequest {
 
 /// A reader of a display as it is seen. Several readers of one display each have their own changes.
 /// Threads:  one at a time.
-/// Lifetime: destroying it closes it; no StreamPicture notice of it comes after that. It outlives neither
-///           its epoch (it then answers Gone) nor harms anybody by being kept.
+/// Lifetime: destroying it closes it; no StreamPicture notice of it comes after that. It may be kept beyond
+///           its epoch and beyond its server, and answers Gone then, as it does once its display was
+///           removed.
 class DisplayStream {
 public:
     virtual ~DisplayStream() = default;
 
+    /// Names the stream in notices; never used twice.
+    virtual std::uint64_t Id() const = 0;
+
     /// The newest picture, with what changed since this reader's last one; Nothing when nothing did. Doesn't
     /// wait for a change.
     virtual DisplayPictureResult TakeNewest(std::chrono::nanoseconds deadline) = 0;
+};
+
+struct DisplayStreamResult {
+    PictureOutcome outcome = PictureOutcome::Failed;
+    std::unique_ptr<DisplayStream> stream; ///< Null unless Ok.
 };
 
 // ---- Pointer and cursor
@@ -307,12 +338,12 @@ struct Notice {
     CGDirectDisplayID display = 0;
     unsigned flags = 0;
     pid_t pid = 0;
-    const DisplayStream* stream = nullptr; ///< To be compared only.
+    std::uint64_t stream = 0; ///< DisplayStream::Id
 };
 
 /// Takes notices in. It only queues them, so a server may call it under its own locks and from any of its
-/// threads, in the order in which things happened. The layer above delivers them later, on a thread of its
-/// own.
+/// threads, in the order in which things happened. It never throws and never calls a server. The layer above
+/// delivers them later, on a thread of its own.
 class NoticeReceiver {
 public:
     virtual ~NoticeReceiver() = default;
@@ -350,21 +381,29 @@ public:
     virtual std::shared_ptr<const ApplicationList> GetApplications() const = 0;
 
     /// False when the position is not known; `position` then stays as it was.
+    /// The one look-up that may ask the desktop, since not every desktop tells of each move; it waits 100 ms
+    /// at most.
     virtual bool GetPointerPosition(CGPoint& position) const = 0;
     /// Null when there is no image. The same object as long as the serial is the same.
     virtual std::shared_ptr<const CursorImage> GetCursor() const = 0;
 
     // Pictures.
     /// One picture of the listed windows and of nothing else: never a pixel of a window that is not listed,
-    /// of one whose sharing state is None, or of what lay behind a window before it had painted itself. A
-    /// picture that can't be had in that purity is not given.
+    /// of one whose sharing state is None, or of what lay behind a window before it had painted itself. What
+    /// a window has not painted yet, and what lies outside its shape, is transparent; a window with nothing
+    /// to show has no layer. Ok may come without layers.
     ///
-    /// A server without Capability::Windows lists one window a display, whose picture is the display as seen;
-    /// asked for less than all of them it answers Unsupported.
+    /// A server without Capability::Windows lists one window a display, of no owner and of the desktop's
+    /// level, whose picture is the display as seen. Where anything is kept out it answers Unsupported.
     virtual WindowPictureResult TakeWindowPicture(const WindowPictureRequest& request) = 0;
 
-    /// Null when the display doesn't exist or streams are not to be had.
-    virtual std::unique_ptr<DisplayStream> OpenDisplayStream(const DisplayStreamRequest& request) = 0;
+    /// Never waits; the stream answers Nothing until there is a picture. A pointer mode that can't be had is
+    /// Unsupported.
+    virtual DisplayStreamResult OpenDisplayStream(const DisplayStreamRequest& request) = 0;
+
+    /// Ends and joins the server's own threads and closes what they held; the next operation starts them
+    /// anew. Not from inside OnNotice.
+    virtual void Rest() = 0;
 
     /// Brings all windows of a process to the front, in their order. False when there is none or it can't be
     /// done.

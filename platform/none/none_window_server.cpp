@@ -48,9 +48,11 @@ WindowPictureResult NoneWindowServer::TakeWindowPicture(const WindowPictureReque
     return {PictureOutcome::Unsupported, nullptr};
 }
 
-std::unique_ptr<DisplayStream> NoneWindowServer::OpenDisplayStream(const DisplayStreamRequest&) {
-    return nullptr;
+DisplayStreamResult NoneWindowServer::OpenDisplayStream(const DisplayStreamRequest&) {
+    return {PictureOutcome::Unsupported, nullptr};
 }
+
+void NoneWindowServer::Rest() {}
 
 bool NoneWindowServer::BringToFront(pid_t) {
     return false;

@@ -24,7 +24,8 @@ public:
     std::shared_ptr<const CursorImage> GetCursor() const override;
 
     WindowPictureResult TakeWindowPicture(const WindowPictureRequest& request) override;
-    std::unique_ptr<DisplayStream> OpenDisplayStream(const DisplayStreamRequest& request) override;
+    DisplayStreamResult OpenDisplayStream(const DisplayStreamRequest& request) override;
+    void Rest() override;
     bool BringToFront(pid_t pid) override;
 
 private:

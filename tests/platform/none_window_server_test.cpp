@@ -79,8 +79,11 @@ TEST_F(NoneWindowServers, SupportNoPicture) {
 }
 
 TEST_F(NoneWindowServers, OpenNoStream) {
-    for (const CGDirectDisplayID display : {0u, 1u})
-        EXPECT_EQ(m_server.OpenDisplayStream({.display = display}), nullptr) << display;
+    for (const CGDirectDisplayID display : {0u, 1u}) {
+        const DisplayStreamResult opened = m_server.OpenDisplayStream({.display = display});
+        EXPECT_EQ(opened.outcome, PictureOutcome::Unsupported) << display;
+        EXPECT_EQ(opened.stream, nullptr) << display;
+    }
 }
 
 TEST_F(NoneWindowServers, BringNobodyToTheFront) {
