@@ -39,7 +39,7 @@ void CountBytes(benchmark::State& state, std::int64_t bytes) {
 void PlainCopy(benchmark::State& state) {
     const auto source = NewPicture();
     auto target = NewPicture();
-    for (auto _ : state) {
+    while (state.KeepRunning()) {
         std::memcpy(target.data(), source.data(), PICTURE);
         benchmark::DoNotOptimize(target.data());
         benchmark::ClobberMemory();
@@ -51,7 +51,7 @@ BENCHMARK(PlainCopy);
 void WriteFrameData(benchmark::State& state) {
     const auto picture = NewPicture();
     const auto frame = NewFrame();
-    for (auto _ : state)
+    while (state.KeepRunning())
         benchmark::DoNotOptimize(frame->WriteFrameData(picture.data(), PICTURE));
     CountBytes(state, PICTURE);
 }
@@ -62,7 +62,7 @@ void WriteFrameAreaData(benchmark::State& state) {
     const auto picture = NewPicture();
     const auto frame = NewFrame();
     TVLRect rect{8, 8, 8 + side, 8 + side};
-    for (auto _ : state)
+    while (state.KeepRunning())
         benchmark::DoNotOptimize(frame->WriteFrameAreaData(rect, picture.data(), PICTURE));
     CountBytes(state, std::int64_t{side} * side * 4);
 }
@@ -71,7 +71,7 @@ BENCHMARK(WriteFrameAreaData)->Arg(32)->Arg(1024);
 void CopyIShareFrame(benchmark::State& state) {
     const auto source = NewFrame();
     const auto target = NewFrame();
-    for (auto _ : state)
+    while (state.KeepRunning())
         benchmark::DoNotOptimize(target->CopyIShareFrame(source.get()));
     CountBytes(state, PICTURE);
 }
@@ -80,13 +80,13 @@ BENCHMARK(CopyIShareFrame);
 void SwapOrCopy(benchmark::State& state) {
     const auto first = NewFrame();
     const auto second = NewFrame();
-    for (auto _ : state)
+    while (state.KeepRunning())
         benchmark::DoNotOptimize(first->SwapOrCopy(second.get()));
 }
 BENCHMARK(SwapOrCopy);
 
 void FirstPicture(benchmark::State& state) {
-    for (auto _ : state)
+    while (state.KeepRunning())
         benchmark::DoNotOptimize(NewFrame());
 }
 BENCHMARK(FirstPicture);

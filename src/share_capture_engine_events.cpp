@@ -72,7 +72,7 @@ void CShareCaptureEngine::ProcessCaptureFailure(int result) {
         m_nFailureCount = 1;
         m_tickDragStart = 0;
     } else {
-        m_nFailureCount = m_nFailureCount + 1;
+        m_nFailureCount = ShareUtil::Sum(m_nFailureCount, 1);
     }
 }
 

@@ -4,11 +4,11 @@
 #include "src/app_share_config.h"
 #include "src/share_common_util.h"
 #include "src/share_dump_time_usage.h"
+#include "src/share_frame.h"
 #include "src/share_image_save.h"
 #include "src/share_util.h"
 #include "util/cm_trace.h"
 
-#include <cstring>
 #include <exception>
 
 namespace {
@@ -22,17 +22,11 @@ constexpr int FRAMES_PER_MEAN = 50;
 /// So many passes in a row may be without content before it is worth a warning.
 constexpr int UNAVAILABLE_PASSES_TOLERATED = 4;
 
+/// An engine makes both of its frames itself, so they are of one kind.
 bool IsSameData(IShareFrame& a, IShareFrame& b) {
-    const int length = a.GetFrameDataLen();
-    if (length != b.GetFrameDataLen())
-        return false;
-    if (length <= 0)
-        return true;
-    const unsigned char* dataA = a.GetFrameData();
-    const unsigned char* dataB = b.GetFrameData();
-    if (dataA == nullptr || dataB == nullptr)
-        return dataA == dataB;
-    return std::memcmp(dataA, dataB, static_cast<std::size_t>(length)) == 0;
+    auto* const ownA = dynamic_cast<CShareFrame*>(&a);
+    auto* const ownB = dynamic_cast<CShareFrame*>(&b);
+    return ownA != nullptr && ownB != nullptr && ownA->HasSameData(*ownB);
 }
 
 } // namespace
@@ -224,7 +218,8 @@ void CShareCaptureEngine::_ReportNoContent(const Pass& pass) {
                              static_cast<unsigned>(pass.result));
         return;
     }
-    if (++m_nUnavailableTimes > UNAVAILABLE_PASSES_TOLERATED) {
+    m_nUnavailableTimes = ShareUtil::Sum(m_nUnavailableTimes, 1);
+    if (m_nUnavailableTimes > UNAVAILABLE_PASSES_TOLERATED) {
         static CCmRepeatedTraceSite site(10);
         CmTraceRepeated(site, CM_TRACE_WARNING,
                         "[CShareCaptureEngine::_CaptureProcess]>> Capture Content is temporary unavailable, ",
@@ -246,7 +241,7 @@ void CShareCaptureEngine::_DeliverPass(Pass& pass) {
     const unsigned meanBefore = m_statistic.m_nMsAverageCaptureCapabilityTime;
     m_statistic.m_nMsAverageCaptureCapabilityTime =
         meanBefore == 0 ? captureTime : (meanBefore + captureTime) / 2;
-    m_statistic.nTotalFrames = m_statistic.nTotalFrames + 1;
+    m_statistic.nTotalFrames = ShareUtil::Sum(m_statistic.nTotalFrames, 1);
 
     const unsigned deliverTick = ShareTickNow();
     int width = 0;
@@ -301,7 +296,7 @@ bool CShareCaptureEngine::_CheckFrameDuplicate(IShareFrame* frame) {
         m_tickDupStart = 0;
         return false;
     }
-    m_statistic.nDuplicateFrames = m_statistic.nDuplicateFrames + 1;
+    m_statistic.nDuplicateFrames = ShareUtil::Sum(m_statistic.nDuplicateFrames, 1);
     if (m_tickDupStart == 0) {
         m_tickDupStart = now;
         return true;
@@ -335,14 +330,14 @@ void CShareCaptureEngine::_AverageTimes(unsigned deliverTick, int width, int hei
 
     int deliver = static_cast<int>(ShareTickNow() - deliverTick);
     if (const int before = m_statistic.m_nMsAverageDeliverCapabilityTime; keepMean && before != 0)
-        deliver = (before + deliver) / 2;
+        deliver = ShareUtil::Sum(before, deliver) / 2;
     m_statistic.m_nMsAverageDeliverCapabilityTime = deliver;
 
     const unsigned now = ShareTickNow();
     if (const unsigned last = m_tickLastCapture; last != 0) {
         int gap = static_cast<int>(now - last);
         if (const int before = m_statistic.m_nMsAverageCaptureTime; keepMean && before != 0)
-            gap = (before + gap) / 2;
+            gap = ShareUtil::Sum(before, gap) / 2;
         m_statistic.m_nMsAverageCaptureTime = gap;
     }
     m_tickLastCapture = now;

@@ -234,6 +234,23 @@ int CShareFrame::CopyIShareFrame(IShareFrame* source) {
     return 0;
 }
 
+int CShareFrame::_GetBackedDataLen() const {
+    return std::min(_GetFrameDataLen(), m_nBufLen);
+}
+
+bool CShareFrame::HasSameData(CShareFrame& other) {
+    const int len = _GetBackedDataLen();
+    if (_GetFrameDataLen() != other._GetFrameDataLen() || len != other._GetBackedDataLen()) {
+        return false;
+    }
+    const unsigned char* const data = _BufferInForce();
+    const unsigned char* const otherData = other._BufferInForce();
+    if (len <= 0 || data == nullptr || otherData == nullptr) {
+        return data == otherData || len <= 0;
+    }
+    return std::memcmp(data, otherData, static_cast<std::size_t>(len)) == 0;
+}
+
 int CShareFrame::SwapOrCopy(IShareFrame* other) {
     auto* const frame = dynamic_cast<CShareFrame*>(other);
     if (frame == nullptr || m_pExternalBuf != nullptr || frame->m_pExternalBuf != nullptr) {

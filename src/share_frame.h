@@ -58,6 +58,10 @@ public:
     int SwapOrCopy(IShareFrame* other) override;
     void Reset() override { m_nLineBytes = 0; }
 
+    /// Whether both have the same data length and the same pixels. Compares no more than there is: after a
+    /// Reset the geometry of a frame may ask for more than its memory holds.
+    bool HasSameData(CShareFrame& other);
+
     void SetMetaInfo(const MetaInfo& info) override { m_metaInfo = info; }
     MetaInfo GetMetaInfo() const override { return m_metaInfo; }
 
@@ -72,6 +76,7 @@ private:
     bool _IsEmptyFrame() const { return m_nHeight < 1 || m_nWidth < 1; }
     bool _CanSetExternalLineLen() const { return true; }
     bool _IsRectInFrame(const TVLRect& rect) const;
+    int _GetBackedDataLen() const;
     bool _ExceedsOwnBuf(int len) const { return m_pOwnBuf != nullptr && len > m_nBufLen; }
     void _SwapFields(CShareFrame& other);
 

@@ -31,6 +31,7 @@ public:
     /// memory.
     virtual int SetExternalBuf(unsigned char* buf, int len) = 0;
 
+    /// A frame that is used again keeps its timestamp until it gets another; 0 lets the engine stamp it.
     /// Milliseconds of a monotonic clock (std::chrono::steady_clock), cut to 32 bits; never 0 once stamped.
     virtual void SetTimestamp(unsigned timestamp) = 0;
     virtual unsigned GetTimestamp() = 0;
@@ -81,7 +82,8 @@ public:
     /// Exchanges everything with the other frame in constant time where both frames own their memory;
     /// otherwise copies from it.
     virtual int SwapOrCopy(IShareFrame* other) = 0;
-    /// Forgets an explicit line length, nothing else.
+    /// Forgets an explicit line length, nothing else. Memory follows with the next setter, so set the geometry
+    /// right after it.
     virtual void Reset() = 0;
 
     virtual void SetMetaInfo(const MetaInfo& info) = 0;

@@ -198,6 +198,34 @@ TEST_F(ShareCaptureStep, TakesTheScaleFromTheCapturerWhenTheFrameDoesNotSay) {
     EXPECT_EQ(bench.calls.Count("GetScaleFactor"), 1u);
 }
 
+TEST_F(ShareCaptureStep, TakesTheScaleOfTheProcessWhenTheCapturerHasGoneByThen) {
+    CEngineBench<CShareCaptureDesktopEngine> desktop(true);
+    desktop.BeginInline();
+    desktop.capturer.SetHook([&](IShareFrame*) { desktop.engine->GiveOwnCapturer(nullptr); });
+    AppShareConfig::Instance()->SetCurrentScale(1.5F);
+    desktop.Pass(3);
+    EXPECT_EQ(desktop.pointing->polledScale, 1.5F);
+    EXPECT_EQ(desktop.sink.FrameCount(), 1u);
+    desktop.engine->GiveOwnCapturer(Borrow(desktop.capturer));
+    AppShareConfig::Instance()->SetCurrentScale(0.05F);
+    desktop.Pass(3);
+    EXPECT_EQ(desktop.pointing->polledScale, 0.1F);
+}
+
+TEST_F(ShareCaptureStep, GoesOnAfterAFallbackThatLeftNoCapturer) {
+    CEngineBench<CShareCaptureDesktopEngine> desktop(true);
+    desktop.BeginInline();
+    desktop.engine->m_eCaptureMode = MODE_7;
+    desktop.capturer.SetResult(-7);
+    desktop.Pass(3);
+    EXPECT_EQ(desktop.Statistic().eCaptureMode, SCREEN_CAPTURER_TYPE_DEFAULT);
+    EXPECT_EQ(desktop.Statistic().nFlags, 2u);
+    EXPECT_EQ(desktop.engine->_GetOwnCapturer(), nullptr);
+    EXPECT_TRUE(desktop.trace.Contains("Fail Capture Content, ret=4294967289"));
+    desktop.Pass(3);
+    EXPECT_EQ(desktop.calls.Count("Capture"), 1u);
+}
+
 TEST_F(ShareCaptureStep, AsksForTheScaleWhateverTheResultWas) {
     bench.BeginInline();
     bench.capturer.SetResult(-1);

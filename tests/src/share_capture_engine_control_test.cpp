@@ -90,7 +90,10 @@ protected:
         EXPECT_EQ(bench.engine->SetExternalIShareCapturer(&control), 0);
         bench.Forget();
     }
-    ~ControlOperations() override { EXPECT_EQ(bench.engine->Stop(), 0); }
+    ~ControlOperations() override {
+        EXPECT_EQ(bench.engine->Stop(), 0);
+        EXPECT_EQ(bench.engine->SetExternalIShareCapturer(nullptr), 0); // it ends before the engine does
+    }
 
     CEngineBench<> bench;
     CControlCapturer control{bench.calls};
@@ -204,6 +207,7 @@ TEST(AddSharedWindow, UpdatesTheSizeOfAWindowEngineWhateverTheResult) {
         EXPECT_EQ(bench.engine->RemoveSharedWindow(7), result);
         EXPECT_EQ(bench.calls.Calls(), Texts{"RemoveSharedWindow 7"});
     }
+    bench.engine->GiveOwnCapturer(nullptr);
 }
 
 // Sources.

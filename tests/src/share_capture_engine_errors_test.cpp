@@ -6,6 +6,7 @@
 #include <cstdint>
 #include <functional>
 #include <sstream>
+#include <stdexcept>
 #include <string>
 #include <vector>
 
@@ -17,6 +18,7 @@ namespace {
 using Lines = std::vector<std::string>;
 
 const std::string PASS = "src/share_capture_engine_pass";
+const std::string IPC = "src/share_capture_engine_ipc";
 
 std::string Hex(const void* pointer) {
     std::ostringstream text;
@@ -25,12 +27,14 @@ std::string Hex(const void* pointer) {
 }
 
 /// The first error after a start comes in full; the site's own counter then lets 1, 101 and 201 through.
-void ExpectThinnedOut(CEngineBench<>& bench, const std::string& message, const std::function<void()>& fail) {
+template <class Bench>
+void ExpectThinnedOut(Bench& bench, const std::string& message, const std::function<void()>& fail,
+                      const std::string& path = PASS) {
     bench.engine->m_bFirstError = true;
     fail();
     Lines lines = bench.trace.LinesContaining(message);
     ASSERT_EQ(lines.size(), 1u);
-    EXPECT_TRUE(IsLineAt(lines[0], Error(message), PASS));
+    EXPECT_TRUE(IsLineAt(lines[0], Error(message), path));
     EXPECT_FALSE(bench.engine->m_bFirstError);
 
     bench.trace.Clear();
@@ -40,7 +44,7 @@ void ExpectThinnedOut(CEngineBench<>& bench, const std::string& message, const s
         ASSERT_EQ(bench.trace.CountContaining(message), expected) << "occurrence " << occurrence;
     }
     lines = bench.trace.LinesContaining(message);
-    EXPECT_TRUE(AreAllAt(lines, ThinnedError(message), PASS));
+    EXPECT_TRUE(AreAllAt(lines, ThinnedError(message), path));
     for (const CTraceLog::Entry& entry : bench.trace.Entries()) {
         if (entry.level == CM_TRACE_ERROR) {
             EXPECT_EQ(entry.tag, std::nullopt);
@@ -140,4 +144,31 @@ TEST_F(ShareCaptureEngineErrors, TellOfSinksThatVanishDuringThePass) {
     });
     EXPECT_EQ(bench.sink.FrameCount(), 0u);
     EXPECT_EQ(bench.Statistic().nTotalFrames, 202) << "the frame counts all the same";
+}
+
+TEST_F(ShareCaptureEngineErrors, TellOfCapturersThatThrow) {
+    CEngineBench<> bench;
+    bench.BeginInline();
+    bench.capturer.SetHook([](IShareFrame*) { throw std::runtime_error("no camera"); });
+    ExpectThinnedOut(bench, "[CShareCaptureEngine::_CaptureProcess]>>Capture threw no camera",
+                     [&] { bench.Pass(); });
+}
+
+TEST_F(ShareCaptureEngineErrors, TellOfAPassInAnotherProcessWithoutAFrame) {
+    CEngineBench<CIpcEngine> bench;
+    bench.BeginInline();
+    bench.engine->m_pCurShareFrame = nullptr;
+    ExpectThinnedOut(
+        bench, "[CShareCaptureEngine::_IpcCaptureProcess]>>pIShareFrame=0x0", [&] { bench.Pass(); }, IPC);
+}
+
+TEST_F(ShareCaptureEngineErrors, TellOfAPassInAnotherProcessWithoutACapturer) {
+    CEngineBench<CIpcEngine> bench;
+    bench.BeginInline();
+    bench.engine->m_pIShareCapturerExternal = nullptr;
+    ExpectThinnedOut(
+        bench,
+        "[CShareCaptureEngine::_IpcCaptureProcess]>>pIShareFrame=" + Hex(bench.engine->m_pCurShareFrame) +
+            ">>pIShareCapturer=0x0",
+        [&] { bench.Pass(); }, IPC);
 }

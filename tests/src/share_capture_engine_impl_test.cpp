@@ -397,3 +397,10 @@ TEST(ShareCaptureEngineExternalPointing, IsStoredWithATrace) {
               (Lines{Info("[CShareCaptureEngine::EnableExternalISharePointing]>>m_bUseExternalPoint=1"),
                      Info("[CShareCaptureEngine::EnableExternalISharePointing]>>m_bUseExternalPoint=0")}));
 }
+
+TEST(ShareCaptureEngineInterface, RefusesASwitchWhereAnEngineOffersNone) {
+    CShareCaptureEngine engine;
+    bool on = true;
+    EXPECT_EQ(engine.IShareCaptureEngine::Config(SHARE_CAPTURE_ENGINE_CONFIG_FORCE_FRAME, &on, sizeof on),
+              -1);
+}

@@ -33,6 +33,12 @@ TEST(ShareCaptureEnginePass, AsksCapturerPointerAndSinkInThatOrder) {
     image->Release();
 }
 
+TEST(ShareCaptureEnginePass, IsNoneForATickWithoutAnEngine) {
+    const CTraceLog trace;
+    EXPECT_EQ(CShareCaptureEngine::ThreadRun(nullptr), 0u);
+    EXPECT_EQ(trace.Lines(), Lines{});
+}
+
 TEST(ShareCaptureEnginePass, TracesAFirstFrameInItsOrder) {
     CEngineBench<> bench;
     bench.BeginInline();

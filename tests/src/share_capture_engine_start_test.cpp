@@ -238,7 +238,7 @@ TEST(ShareCaptureEngineStart, FailsWithItsCodeAndTracesWhenTheWorkerCannotBeStar
     EXPECT_EQ(bench.engine->SetSink(&bench.sink), 0);
     bench.Forget();
     {
-        const CNoRoomForThreads noRoom;
+        const CNoNewThreadsScope noRoom;
         EXPECT_EQ(bench.engine->Start(), -1);
     }
     EXPECT_EQ(bench.engine->GetCaptureStatus(), SHARE_CAPTURE_ENGINE_STATUS_STOPPED);
@@ -269,7 +269,7 @@ TEST(ShareCaptureEngineStart, FailsWithItsCodeAndTracesWhenTheWorkerCannotBeStar
 TEST(ShareCaptureEngineStart, SucceedsOnceThreadsCanBeStartedAgain) {
     CEngineBench<> bench;
     {
-        const CNoRoomForThreads noRoom;
+        const CNoNewThreadsScope noRoom;
         EXPECT_EQ(bench.engine->Start(), -1);
     }
     bench.Start();
@@ -280,7 +280,7 @@ TEST(ShareCaptureEngineStart, SucceedsOnceThreadsCanBeStartedAgain) {
 TEST(ShareCaptureEngineStart, RunsWithoutEventsWhenTheAssistThreadCannotBeStarted) {
     CEngineBench<> bench;
     {
-        const CNoRoomForThreads noRoom;
+        const CNoNewThreadsScope noRoom;
         EXPECT_EQ(bench.engine->SetSink(&bench.sink), 0);
     }
     EXPECT_EQ(bench.engine->_GetAssistThread(), nullptr);

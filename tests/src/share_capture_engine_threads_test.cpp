@@ -42,7 +42,7 @@ bool AreAllSignalsBlocked() {
 
 TEST(ShareCaptureEngineThreads, AreGoneAfter200RoundsOfStartAndStop) {
     CEngineBench<> bench;
-    const std::ptrdiff_t threads = CountThreadsOfProcess();
+    const std::ptrdiff_t threads = CountThreadsAtRest();
     const int rounds = 200 * TestEffort();
     for (int round = 0; round < rounds; ++round) {
         bench.Start();
@@ -57,7 +57,7 @@ TEST(ShareCaptureEngineThreads, AreGoneAfter200RoundsOfStartAndStop) {
 }
 
 TEST(ShareCaptureEngineThreads, AreGoneAfter200EnginesWereCreatedAndDestroyed) {
-    const std::ptrdiff_t threads = CountThreadsOfProcess();
+    const std::ptrdiff_t threads = CountThreadsAtRest();
     CCallLog calls;
     CRecordingSink sink(calls);
     CFakeCapturer capturer(calls);
@@ -74,7 +74,7 @@ TEST(ShareCaptureEngineThreads, AreGoneAfter200EnginesWereCreatedAndDestroyed) {
 }
 
 TEST(ShareCaptureEngineThreads, AreGoneWhenAnEngineThatOnlyHadASinkIsDestroyed) {
-    const std::ptrdiff_t threads = CountThreadsOfProcess();
+    const std::ptrdiff_t threads = CountThreadsAtRest();
     {
         CEngineBench<> bench;
         EXPECT_EQ(bench.engine->SetSink(&bench.sink), 0);
@@ -84,7 +84,7 @@ TEST(ShareCaptureEngineThreads, AreGoneWhenAnEngineThatOnlyHadASinkIsDestroyed) 
 }
 
 TEST(ShareCaptureEngineThreads, AreOneMoreForTheWorkerAndOneForTheEvents) {
-    const std::ptrdiff_t threads = CountThreadsOfProcess();
+    const std::ptrdiff_t threads = CountThreadsAtRest();
     CEngineBench<> first;
     EXPECT_EQ(first.engine->Start(), 0);
     EXPECT_EQ(CountThreadsOfProcess(), threads + 2);

@@ -136,7 +136,7 @@ TEST_F(CaptureTaskThread, TracesItsRateItsStartAndItsEnd) {
 
 TEST_F(CaptureTaskThread, TracesItsStartEvenWhenItCouldNotStart) {
     {
-        const CNoRoomForThreads noRoom;
+        const CNoNewThreadsScope noRoom;
         EXPECT_EQ(worker->CreateCaptureThread(TickTarget::Tick, &target, 30), -1);
     }
     const Lines lines = trace.Lines();

@@ -85,7 +85,7 @@ TEST(DestroyShareCaptureEngine, TracesTheKindFirstAndGivesUpTheLibraryLast) {
 }
 
 TEST(DestroyShareCaptureEngine, StopsAnEngineThatRuns) {
-    const std::ptrdiff_t threads = CountThreadsOfProcess();
+    const std::ptrdiff_t threads = CountThreadsAtRest();
     CEngineBench<> bench;
     bench.Start();
     bench.Tick();

@@ -5,6 +5,7 @@
 #include <gtest/gtest.h>
 
 #include <climits>
+#include <cstddef>
 #include <optional>
 
 namespace {
@@ -166,8 +167,8 @@ TEST(ShareFrameArea, TakesTheBytesPerPixelFromTheLine) {
         ASSERT_EQ(frame->SetFrameLineBytes(at.line), 0);
         const Bytes row = Pattern(20);
         EXPECT_EQ(Write(*frame, {3, 1, 5, 2}, row), at.moved);
-        const auto start = static_cast<std::size_t>(at.line + 3 * at.moved / 2);
         const auto count = static_cast<std::size_t>(at.moved);
+        const std::size_t start = static_cast<std::size_t>(at.line) + 3 * count / 2;
         EXPECT_EQ(Part(FirstBytes(*frame, start + count), start, count), Part(row, 0, count));
     }
 }

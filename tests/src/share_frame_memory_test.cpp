@@ -312,3 +312,36 @@ TEST(ShareFrameInterface, IsTheFirstBaseOfTheFrame) {
 }
 
 } // namespace
+
+TEST(ShareFrame, ComparesNoMoreThanItsMemoryHolds) {
+    auto* const a = new CShareFrame;
+    auto* const b = new CShareFrame;
+    for (CShareFrame* const frame : {a, b}) {
+        frame->AddRef();
+        frame->SetFrameSize(10, 10);
+        frame->SetFrameLineBytes(30);
+        frame->SetFrameDataFormat(SHARE_FRAME_FORMAT_RGBA);
+        frame->Reset(); // lines of 40 bytes now, in memory for lines of 30
+    }
+    ASSERT_EQ(a->GetFrameDataLen(), 400);
+    EXPECT_TRUE(a->HasSameData(*b));
+    b->GetFrameData()[299] = 1;
+    EXPECT_FALSE(a->HasSameData(*b));
+    b->SetFrameSize(10, 9);
+    EXPECT_FALSE(a->HasSameData(*b));
+    a->Release();
+    b->Release();
+}
+
+TEST(ShareFrame, IsTheSameAsAnotherWithoutPixels) {
+    auto* const a = new CShareFrame;
+    auto* const b = new CShareFrame;
+    a->AddRef();
+    b->AddRef();
+    EXPECT_TRUE(a->HasSameData(*b));
+    b->SetFrameSize(1, 1);
+    b->SetFrameDataFormat(SHARE_FRAME_FORMAT_RGBA);
+    EXPECT_FALSE(a->HasSameData(*b));
+    a->Release();
+    b->Release();
+}

@@ -1,6 +1,11 @@
 // SPDX-License-Identifier: Apache-2.0
 #include "tests/support/engine_bench.h"
 
+#include <unistd.h>
+
+#include <filesystem>
+#include <thread>
+
 #include <pthread.h>
 
 namespace {
@@ -66,16 +71,11 @@ bool IsOnlyTestOfProcess() {
     return testing::UnitTest::GetInstance()->test_to_run_count() == 1;
 }
 
-CNoRoomForThreads::CNoRoomForThreads() {
-    pthread_getattr_default_np(&m_before);
-    pthread_attr_t huge;
-    pthread_attr_init(&huge);
-    pthread_attr_setstacksize(&huge, std::size_t{1} << 47);
-    EXPECT_EQ(pthread_setattr_default_np(&huge), 0);
-    pthread_attr_destroy(&huge);
-}
-
-CNoRoomForThreads::~CNoRoomForThreads() {
-    pthread_setattr_default_np(&m_before);
-    pthread_attr_destroy(&m_before);
+std::ptrdiff_t CountThreadsAtRest() {
+    pid_t id = 0;
+    std::thread([&id] { id = gettid(); }).join();
+    // What has just been joined may stay in the system's list for a moment.
+    while (std::filesystem::exists("/proc/self/task/" + std::to_string(id)))
+        std::this_thread::yield();
+    return CountThreadsOfProcess();
 }

@@ -1,4 +1,5 @@
 // SPDX-License-Identifier: Apache-2.0
+#include "tests/support/clock_moved_during_read.h"
 #include "tests/support/threads.h"
 #include "tests/support/trace_log.h"
 #include "util/cm_thread.h"
@@ -64,6 +65,20 @@ TEST(ComTaskThreadOnAManualClock, WakesByTheMoveAlone) {
     ASSERT_EQ(Schedule(*thread, handler, 10ms), 0);
     clock->Advance(10ms);
     EXPECT_TRUE(handler.m_ticks.Reaches(1));
+}
+
+TEST(ComTaskThreadOnAManualClock, MissesNoMoveOnItsWayToSleep) {
+    CClockMovedDuringRead clock;
+    CmReplaceClock(&clock);
+    {
+        CRunningThread thread;
+        TickHandler handler;
+        Settle(*thread);
+        clock.MoveDuring(2, 10ms); // the first one finds the timer not due yet, the second one falls asleep
+        ASSERT_EQ(Schedule(*thread, handler, 10ms), 0);
+        EXPECT_TRUE(handler.m_ticks.Reaches(1));
+    }
+    CmReplaceClock(nullptr);
 }
 
 TEST(ComTaskThreadOnAManualClock, DropsTheTicksThatComeDueDuringATick) {
