@@ -1,9 +1,8 @@
 // SPDX-License-Identifier: Apache-2.0
 #include "json/json.h"
 
-#include <locale.h>
-#include <strings.h>
-
+#include <algorithm>
+#include <clocale>
 #include <cstdlib>
 #include <optional>
 #include <stack>
@@ -162,14 +161,20 @@ Value ClassifyNumber(const std::string& token) {
     return Value(d);
 }
 
+/// `word` is in lower case; other letters than ASCII ones have no case.
+bool IsWord(Text token, Text word) {
+    const auto isSame = [](char a, char b) { return a == b || (a >= 'A' && a <= 'Z' && a - 'A' + 'a' == b); };
+    return std::equal(token.begin(), token.end(), word.begin(), word.end(), isSame);
+}
+
 Value ClassifyToken(const std::string& token, bool isReal) {
-    if (strcasecmp(token.c_str(), "true") == 0)
+    if (IsWord(token, "true"))
         return Value(true);
-    if (strcasecmp(token.c_str(), "false") == 0)
+    if (IsWord(token, "false"))
         return Value(false);
     if (isReal)
         return Value(ToDouble(token));
-    if (strcasecmp(token.c_str(), "null") == 0)
+    if (IsWord(token, "null"))
         return Value();
     return ClassifyNumber(token);
 }

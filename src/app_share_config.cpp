@@ -1,8 +1,8 @@
 // SPDX-License-Identifier: Apache-2.0
 #include "src/app_share_config.h"
 
-#include "src/share_debug_file.h"
 #include "util/cm_clock.h"
+#include "util/cm_trusted_file.h"
 
 #include <screenshare/share_types.h>
 
@@ -87,7 +87,7 @@ void AppShareConfig::ReadNumber(const char* key, ShareRelaxed<int>& setting) {
 }
 
 bool AppShareConfig::CheckConfig() {
-    const std::optional<std::string> text = ReadDebugFile(m_strConfigDir, CONFIG_FILE);
+    const std::optional<std::string> text = CmReadTrustedFile(m_strConfigDir, CONFIG_FILE);
     return text && CheckConfig(text->c_str());
 }
 

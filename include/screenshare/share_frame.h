@@ -82,8 +82,8 @@ public:
     /// Exchanges everything with the other frame in constant time where both frames own their memory;
     /// otherwise copies from it.
     virtual int SwapOrCopy(IShareFrame* other) = 0;
-    /// Forgets an explicit line length, nothing else. Memory follows with the next setter, so set the geometry
-    /// right after it.
+    /// Forgets an explicit line length, nothing else. Memory follows with the next setter, so set the
+    /// geometry right after it.
     virtual void Reset() = 0;
 
     virtual void SetMetaInfo(const MetaInfo& info) = 0;

@@ -1,8 +1,8 @@
 // SPDX-License-Identifier: Apache-2.0
 #include "src/app_share_config.h"
-#include "src/share_debug_file.h"
 #include "tests/support/engine_bench.h"
 #include "tests/support/threads.h"
+#include "util/cm_trusted_file.h"
 
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>

@@ -314,6 +314,43 @@ TEST(ShareCaptureEngineStop, IsNotHeldUpByACapturerThatStartsTheEngineFromAContr
     EXPECT_EQ(bench.engine->GetCaptureStatus(), SHARE_CAPTURE_ENGINE_STATUS_STOPPED);
 }
 
+namespace {
+
+/// Stops an engine from inside the trace of an error that is being told, once it is let.
+struct StoppingReceiver {
+    IShareCaptureEngine* engine;
+    CTally inside;
+    CGate gate;
+
+    static void Receive(void* context, int, const char*, const char* text, int) {
+        auto& self = *static_cast<StoppingReceiver*>(context);
+        if (std::string(text).find("OnCaptureError, nErrorCode=") == std::string::npos)
+            return;
+        self.inside.Add();
+        EXPECT_TRUE(self.gate.Passes());
+        self.engine->Stop();
+    }
+};
+
+} // namespace
+
+TEST(ShareCaptureEngineStop, IsNotHeldUpByATraceReceiverThatStopsTheEngine) {
+    CEngineBench<> bench;
+    bench.Start();
+    bench.SettleEvents();
+    StoppingReceiver receiver{bench.engine, {}, {}};
+    CmSetTraceReceiver(StoppingReceiver::Receive, &receiver);
+    bench.engine->OnCaptureError(-204); // traced on the assist thread, outside the sink's callback
+    ASSERT_TRUE(receiver.inside.Reaches(1));
+    {
+        const CCallOnThread stop([&] { EXPECT_EQ(bench.engine->Stop(), 0); });
+        stop.UntilItWaits();
+        receiver.gate.Open();
+    }
+    CmSetTraceReceiver(nullptr, nullptr);
+    EXPECT_EQ(bench.engine->GetCaptureStatus(), SHARE_CAPTURE_ENGINE_STATUS_STOPPED);
+}
+
 TEST(ShareCaptureEngineSetSink, ToNoneReturnsOnlyAfterARunningCallback) {
     CEngineBench<> bench;
     CGate gate;

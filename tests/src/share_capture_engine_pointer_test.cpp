@@ -173,11 +173,12 @@ TEST_F(SharePointer, HoldsOneReferenceOnTheLatestImage) {
     EXPECT_EQ(image->GetReference(), 2u) << "the same image is counted once";
     EXPECT_EQ(bench.engine->OnPointingImgChanged(next), 0);
     EXPECT_EQ(image->GetReference(), 1u);
-    EXPECT_EQ(next->GetReference(), 2u);
+    EXPECT_EQ(next->Release(), 1u);
+    EXPECT_EQ(bench.engine->OnPointingImgChanged(next), 0);
+    EXPECT_EQ(bench.calls.Count("image deleted"), 0u) << "told of its own image, the engine let go of it";
     EXPECT_EQ(bench.engine->OnPointingImgChanged(nullptr), 0);
-    EXPECT_EQ(next->GetReference(), 1u);
+    EXPECT_EQ(bench.calls.Count("image deleted"), 1u);
     EXPECT_EQ(bench.engine->m_pCursorImg, nullptr);
-    next->Release();
 }
 
 TEST_F(SharePointer, NeitherPositionNorImageReachTheSink) {

@@ -167,8 +167,6 @@ class CDesktopPlayer {
 public:
     static constexpr TVLSize DESKTOP{2880, 1800};
 
-    explicit CDesktopPlayer(const TVLRect& box) : m_box(box) {}
-
     void PlayInto(CFakeCapturer& capturer, TVLSize limit) const {
         const float fit = std::min(static_cast<float>(limit.cx) / static_cast<float>(DESKTOP.cx),
                                    static_cast<float>(limit.cy) / static_cast<float>(DESKTOP.cy));
@@ -179,9 +177,6 @@ public:
             answers.rectCapture = {0, 0, DESKTOP.cx, DESKTOP.cy};
         });
     }
-
-private:
-    TVLRect m_box;
 };
 
 /// Whether the box is as large as the limit lets it be: within the dead band, or the desktop at its full
@@ -210,7 +205,7 @@ TEST_F(WindowArea, ConvergesWithinTenPassesForEveryPairOfBoxAndLimit) {
             SCOPED_TRACE(testing::PrintToString(box.right - box.left) + "x" +
                          testing::PrintToString(box.bottom - box.top) + " into " + Text(limit));
             context->Share(box);
-            const CDesktopPlayer player(box);
+            const CDesktopPlayer player;
             bench.engine->SetCaptureMaxFrameSize(static_cast<unsigned>(limit.cx),
                                                  static_cast<unsigned>(limit.cy));
             for (int pass = 0; pass < 10; ++pass) {

@@ -5,6 +5,7 @@
 #include "util/cm_thread.h"
 
 #include <gtest/gtest.h>
+#include <unistd.h>
 
 #include <pthread.h>
 
@@ -16,6 +17,7 @@
 #include <iterator>
 #include <memory>
 #include <mutex>
+#include <string>
 #include <thread>
 #include <utility>
 
@@ -133,8 +135,18 @@ private:
     pthread_attr_t m_before;
 };
 
-/// How many threads the operating system counts in this process; a sanitizer's own ones are among them.
+/// Has a sanitizer start the thread of its own that comes with the first one of a process.
+inline bool BringSanitizersThread() {
+    pid_t id = 0;
+    std::thread([&id] { id = gettid(); }).join();
+    while (std::filesystem::exists("/proc/self/task/" + std::to_string(id)))
+        std::this_thread::yield();
+    return true;
+}
+
+/// How many threads the operating system counts in this process; a sanitizer's own one is always among them.
 inline std::ptrdiff_t CountThreadsOfProcess() {
+    [[maybe_unused]] static const bool brought = BringSanitizersThread();
     return std::distance(std::filesystem::directory_iterator("/proc/self/task"), {});
 }
 

@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: Apache-2.0
-#include "src/share_debug_file.h"
+#include "util/cm_trusted_file.h"
 
 #include <fcntl.h>
 #include <sys/stat.h>
@@ -56,7 +56,7 @@ bool ReadFully(int fd, std::string& text) {
 
 } // namespace
 
-std::optional<std::string> ReadDebugFile(const std::string& folder, const char* name) {
+std::optional<std::string> CmReadTrustedFile(const std::string& folder, const char* name) {
     const Descriptor dir(open(folder.c_str(), O_RDONLY | O_DIRECTORY | O_NOFOLLOW | O_CLOEXEC));
     struct stat dirStatus {};
     if (!dir.IsOpen() || fstat(dir.Get(), &dirStatus) != 0 || !IsTrusted(dirStatus))

@@ -10,4 +10,4 @@
 /// to the effective user or to root and nobody else may write to either, neither is a link, and the file is a
 /// plain one. A file of more than 1 MiB, an empty one, and one that changes while it is read count as absent,
 /// too. Never waits: a pipe under that name is not opened for reading.
-std::optional<std::string> ReadDebugFile(const std::string& folder, const char* name);
+std::optional<std::string> CmReadTrustedFile(const std::string& folder, const char* name);
