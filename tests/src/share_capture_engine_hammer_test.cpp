@@ -222,6 +222,18 @@ struct HammeredEngine {
     IShareCaptureEngine* engine;
 };
 
+/// Whether frames come after all that; the sink may pause its engine again, so it takes some asking.
+bool StillDelivers(HammeredEngine& one) {
+    const int before = one.sink.Frames();
+    const auto end = std::chrono::steady_clock::now() + PATIENCE;
+    while (one.sink.Frames() == before && std::chrono::steady_clock::now() < end) {
+        one.engine->Start();
+        one.engine->Resume();
+        std::this_thread::yield();
+    }
+    return one.sink.Frames() > before;
+}
+
 void CallAtRandom(IShareCaptureEngine& engine, unsigned number) {
     unsigned char on = number & 64 ? 1 : 0;
     switch (number % 10) {
@@ -283,6 +295,7 @@ TEST(EngineHammer, EightEnginesOutliveRandomControlCallsFromFourThreadsAndFromTh
     int frames = 0;
     int statusEvents = 0;
     for (const std::unique_ptr<HammeredEngine>& one : engines) {
+        EXPECT_TRUE(StillDelivers(*one));
         EXPECT_EQ(one->engine->Stop(), 0);
         EXPECT_EQ(one->engine->GetCaptureStatus(), SHARE_CAPTURE_ENGINE_STATUS_STOPPED);
         EXPECT_EQ(one->sink.LastStatus(), SHARE_CAPTURE_ENGINE_STATUS_STOPPED) << "a status event was lost";
