@@ -131,7 +131,10 @@ void CShareCaptureEngine::_PostToSink(Fire fire) {
     ICmEventQueue* queue = _GetEventQueue(thread);
     if (queue == nullptr)
         return;
-    auto body = [port = m_sinkPort, fire = std::move(fire)]() mutable { fire(*port); };
+    auto body = [port = m_sinkPort, fire = std::move(fire)]() mutable {
+        const ShareCallOutMark mark; // a trace receiver may call out, too
+        fire(*port);
+    };
     queue->PostEvent(new CCmInvokeEvent(std::move(body)), CM_EVENT_PRIORITY_NORMAL);
 }
 
