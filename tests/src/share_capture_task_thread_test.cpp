@@ -1,6 +1,7 @@
 // SPDX-License-Identifier: Apache-2.0
 #include "src/share_capture_task_thread.h"
 
+#include "tests/support/call_on_thread.h"
 #include "tests/support/engine_bench.h"
 
 #include <gtest/gtest.h>
@@ -10,7 +11,6 @@
 #include <memory>
 #include <stdexcept>
 #include <string>
-#include <thread>
 #include <utility>
 #include <vector>
 
@@ -307,6 +307,25 @@ TEST_F(CaptureTaskThread, TicksOutOfTurnOnWhateverThreadAsks) {
     worker->CaptureProcess();
     EXPECT_EQ(Ticks(), 1);
     EXPECT_EQ(target.thread, GetThreadSelfId());
+}
+
+TEST_F(CaptureTaskThread, IsNotDestroyedWhileItTicksOnWhateverThread) {
+    CGate gate;
+    CTally inside;
+    target.during = [&] {
+        inside.Add();
+        EXPECT_TRUE(gate.Passes());
+    };
+    Start(5);
+    const CCallOnThread tick([&] { worker->CaptureProcess(); });
+    ASSERT_TRUE(inside.Reaches(1));
+    const CCallOnThread destroy([&] {
+        EXPECT_EQ(worker->DestroyCaptureThread(), 0);
+        EXPECT_EQ(Ticks(), 1) << "the tick was not over";
+    });
+    destroy.UntilItWaits();
+    EXPECT_FALSE(destroy.HasReturned());
+    gate.Open();
 }
 
 TEST_F(CaptureTaskThread, RunsItsExitFunctionOnItselfBehindEverythingElse) {
