@@ -2,6 +2,7 @@
 #include "src/share_dump_time_usage.h"
 
 #include "util/cm_clock.h"
+#include "util/cm_numeric.h"
 
 ShareDumpTimeUsage::ShareDumpTimeUsage() {
     Start();
@@ -15,5 +16,5 @@ int ShareDumpTimeUsage::Stop() {
     const std::chrono::nanoseconds now = CmSteadyNow();
     const auto elapsed = static_cast<double>((now - m_start).count());
     m_start = now;
-    return static_cast<int>(elapsed / 1000000.0);
+    return CmTruncate(elapsed / 1000000.0);
 }
