@@ -33,6 +33,10 @@ struct CGRect {
 /// Result of an operation; 0 is success.
 using OSStatus = std::int32_t;
 
+constexpr OSStatus noErr = 0;
+constexpr OSStatus paramErr = -50;
+constexpr OSStatus memFullErr = -108;
+
 /// Never 0 and never all bits set.
 using CGDirectDisplayID = std::uint32_t;
 /// Never 0.

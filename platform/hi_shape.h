@@ -7,12 +7,6 @@
 
 namespace platform {
 
-using OSStatus = int;
-
-constexpr OSStatus noErr = 0;
-constexpr OSStatus paramErr = -50;
-constexpr OSStatus memFullErr = -108;
-
 /// A rectilinear area of the plane: a set of whole units, kept as rectangles.
 ///
 /// Rectangles come and go as CGRect. A shape keeps whole edges only: left = x, top = y, right = x + width,

@@ -2,6 +2,9 @@
 #include "platform/window_server.h"
 
 #include "platform/none/none_window_server.h"
+#include "platform/notices.h"
+#include "platform/simulated/scene.h"
+#include "platform/simulated/simulated_window_server.h"
 #include "platform/window_server_choice.h"
 #include "util/cm_never_destroyed.h"
 
@@ -18,10 +21,14 @@ std::shared_ptr<WindowServer> MakeNone() {
     return std::make_shared<NoneWindowServer>();
 }
 
+std::shared_ptr<WindowServer> MakeSimulated() {
+    return std::make_shared<SimulatedWindowServer>(DefaultScene());
+}
+
 constexpr WindowServerMaker MAKERS[] = {
     {"auto", MakeNone},
     {"none", MakeNone},
-    {"simulated", nullptr},
+    {"simulated", MakeSimulated},
     {"x11", nullptr},
 };
 
@@ -66,7 +73,13 @@ std::shared_ptr<WindowServer> CurrentWindowServer() {
 }
 
 std::shared_ptr<WindowServer> ReplaceWindowServer(std::shared_ptr<WindowServer> server) {
-    return ChoiceOfProcess().Replace(std::move(server));
+    std::shared_ptr<WindowServer> former = ChoiceOfProcess().Replace(std::move(server));
+    FollowWindowServer();
+    return former;
+}
+
+std::shared_ptr<WindowServer> ChosenWindowServer() {
+    return ChoiceOfProcess().Chosen();
 }
 
 } // namespace platform

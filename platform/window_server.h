@@ -415,8 +415,11 @@ public:
 /// is never chosen by itself.
 std::shared_ptr<WindowServer> CurrentWindowServer();
 
-/// Puts another one in force and gives the one that was; null means to choose anew at the next call. For
-/// tests and scenes.
+/// Puts another one in force and gives the one that was; null means to choose anew at the next call. Whoever
+/// is registered for notices hears those of the new one from now on. For tests and scenes.
 std::shared_ptr<WindowServer> ReplaceWindowServer(std::shared_ptr<WindowServer> server);
+
+/// The window server in force, null when none has been chosen yet. Never makes one.
+std::shared_ptr<WindowServer> ChosenWindowServer();
 
 } // namespace platform

@@ -60,6 +60,11 @@ std::shared_ptr<WindowServer> WindowServerChoice::Replace(std::shared_ptr<Window
     return std::exchange(m_inForce, std::move(server));
 }
 
+std::shared_ptr<WindowServer> WindowServerChoice::Chosen() {
+    const std::unique_lock<std::mutex> lock = LockWhenSettled();
+    return lock.owns_lock() ? m_inForce : nullptr;
+}
+
 void WindowServerChoice::BeforeFork() {
     m_mutex.lock();
 }

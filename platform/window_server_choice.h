@@ -41,6 +41,9 @@ public:
     /// Current choose anew. From inside a maker it is a failed check that changes nothing.
     std::shared_ptr<WindowServer> Replace(std::shared_ptr<WindowServer> server);
 
+    /// The server in force, null while none has been chosen.
+    std::shared_ptr<WindowServer> Chosen();
+
     void BeforeFork();
     void AfterForkInParent();
     void AfterForkInChild();

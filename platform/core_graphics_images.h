@@ -1,0 +1,53 @@
+// SPDX-License-Identifier: Apache-2.0
+#pragma once
+
+#include "platform/bitmap_context.h"
+#include "platform/cg_image.h"
+#include "platform/core_types.h"
+
+#include <memory>
+#include <span>
+
+/// Images of chosen windows, put together from the windows' own pictures: what lies in front of them, behind
+/// them or beside them and wasn't chosen is not there.
+///
+/// Threads: any; a call may wait for the desktop, DEFAULT_IMAGE_DEADLINE at most.
+/// Errors:  null for an image; nothing throws.
+namespace platform {
+
+enum CGWindowImageOption : unsigned {
+    kCGWindowImageDefault = 0,             ///< With what is drawn around the frames, such as shadows.
+    kCGWindowImageBoundsIgnoreFraming = 1, ///< The frames only.
+};
+
+/// What chosen windows show within a rectangle, of one moment: still the single pictures, so that drawing it
+/// is the only time that pixels are moved. Immutable; pins the pictures.
+struct CGWindowImage;
+using CGWindowImageRef = std::shared_ptr<const CGWindowImage>;
+
+/// `rect` is in global points. Windows that don't exist any more are left out. `keepsOut` tells whether the
+/// asker keeps anything out, listed or not: a window server that can only give whole displays then gives
+/// nothing. Null for no window, for a rectangle without an area, and when the window server gives no picture.
+CGWindowImageRef CGWindowListTakeImage(const CGRect& rect, std::span<const CGWindowID> windows,
+                                       unsigned options, bool keepsOut) noexcept;
+
+/// Pixels at the scale of the finest picture in it; 0 for null.
+int CGWindowImageGetWidth(const CGWindowImage* image) noexcept;
+int CGWindowImageGetHeight(const CGWindowImage* image) noexcept;
+
+/// Whether drawing it leaves nothing of what was there before. False for null.
+bool CGWindowImageIsOpaque(const CGWindowImage* image) noexcept;
+
+/// Draws it into `rect` as one image would be drawn, and nothing outside of it. What the windows don't cover
+/// stays. False when memory ran out and something may be missing.
+bool CGContextDrawWindowImage(CGContext* context, const CGRect& rect, const CGWindowImage* image) noexcept;
+
+/// In one block, transparent where nothing is. A window that fills it is not copied. Null for null and when
+/// memory runs out.
+CGImageRef CGWindowImageCreateImage(const CGWindowImage* image) noexcept;
+
+/// Both in one, for an asker who keeps things out.
+CGImageRef CGWindowListCreateImageFromArray(const CGRect& rect, std::span<const CGWindowID> windows,
+                                            unsigned options) noexcept;
+
+} // namespace platform

@@ -1,0 +1,60 @@
+// SPDX-License-Identifier: Apache-2.0
+#pragma once
+
+#include "platform/core_graphics.h"
+#include "platform/core_types.h"
+
+#include <sys/types.h>
+#include <cstdint>
+
+/// The window server's connection calls: who owns a window, where it lies in the stack and on the desktop.
+///
+/// One moment: a walk over the windows asks several things of each. So the windows that
+///             CGSGetOnScreenWindowList has listed are pinned for the calling thread, for 100 ms at most or
+///             until it lists anew: what it asks of a window meanwhile is answered as of that list, however
+///             the desktop goes on. Counting and listing themselves always tell of now.
+/// Threads:    any; each has its own pin.
+/// Errors:     kCGErrorSuccess, and only then an out parameter is written; kCGErrorInvalidConnection for
+///             connection 0, kCGErrorIllegalArgument for a null out parameter and for a window that isn't
+///             there, kCGErrorFailure for what the server can't tell of one. Counts and lists give
+///             kCGErrorCannotComplete when there is no window server. Nothing throws.
+namespace platform {
+
+struct ProcessSerialNumber;
+
+/// A process's connection to the window server: one for each process, the same for as long as it lives.
+/// Never 0.
+using CGSConnectionID = std::uint32_t;
+
+/// The connection of this process, 0 when there is no window server. Elsewhere this call has a leading
+/// underscore, which C++ keeps for its implementations.
+CGSConnectionID CGSDefaultConnection() noexcept;
+
+/// The number of windows on screen: those of `target`, or of all processes for 0.
+CGError CGSGetOnScreenWindowCount(CGSConnectionID connection, CGSConnectionID target, int* count) noexcept;
+
+/// Writes the first `size` windows on screen, the front one first, and tells in `read` how many there are,
+/// which may be more than `size`. Null `list` is allowed for size 0.
+CGError CGSGetOnScreenWindowList(CGSConnectionID connection, CGSConnectionID target, int size, int* list,
+                                 int* read) noexcept;
+
+CGError CGSGetWindowLevel(CGSConnectionID connection, CGWindowID window, int* level) noexcept;
+
+/// From 0, fully transparent, to 1.
+CGError CGSGetWindowAlpha(CGSConnectionID connection, CGWindowID window, float* alpha) noexcept;
+
+/// The visible frame, in global points.
+CGError CGSGetScreenRectForWindow(CGSConnectionID connection, CGWindowID window, CGRect* rect) noexcept;
+
+/// The connection of the process that owns a window; kCGErrorFailure when its owner can't be told.
+CGError CGSGetWindowOwner(CGSConnectionID connection, CGWindowID window, CGSConnectionID* owner) noexcept;
+
+/// The process behind a connection; kCGErrorInvalidConnection for what is none.
+CGError CGSConnectionGetPID(CGSConnectionID connection, pid_t* pid) noexcept;
+
+/// The connection of a process that GetProcessForPID or GetNextProcess has given; kCGErrorIllegalArgument for
+/// all zeros.
+CGError CGSGetConnectionIDForPSN(CGSConnectionID connection, const ProcessSerialNumber* process,
+                                 CGSConnectionID* processConnection) noexcept;
+
+} // namespace platform
