@@ -4,7 +4,6 @@
 #include <benchmark/benchmark.h>
 
 #include <cstddef>
-#include <random>
 #include <vector>
 
 /// What regions cost: each operation on regions of 1 to 1 000 rectangles, and the judgement of a whole window
@@ -114,99 +113,5 @@ BENCHMARK(BM_Equality)->RangeMultiplier(10)->Range(1, 1000);
 BENCHMARK(BM_GetRects)->RangeMultiplier(10)->Range(1, 1000);
 BENCHMARK(BM_GetRgnBox)->RangeMultiplier(10)->Range(1, 1000);
 BENCHMARK(BM_ToString)->RangeMultiplier(10)->Range(1, 1000);
-
-/// Two displays side by side.
-constexpr TVLRect kDesktop{0, 0, 5120, 1440};
-
-struct WindowSizes {
-    int smallest;
-    int largest;
-};
-constexpr WindowSizes kWindows{200, 1200};
-/// Tool tips and palettes: they hide little of each other, so the regions grow with every one of them.
-constexpr WindowSizes kSmallWindows{40, 160};
-
-int Pick(std::mt19937& random, int lowest, int highest) {
-    return lowest + static_cast<int>(random() % static_cast<unsigned>(highest - lowest + 1));
-}
-
-std::vector<TVLRect> ScatteredWindows(int count, const WindowSizes& sizes) {
-    std::mt19937 random(1);
-    std::vector<TVLRect> windows;
-    for (int i = 0; i < count; ++i) {
-        const int width = Pick(random, sizes.smallest, sizes.largest);
-        const int height = Pick(random, sizes.smallest, sizes.largest) * 2 / 3;
-        const int left = Pick(random, kDesktop.left - width / 2, kDesktop.right - width / 2);
-        const int top = Pick(random, kDesktop.top, kDesktop.bottom - height / 2);
-        windows.push_back({left, top, left + width, top + height});
-    }
-    return windows;
-}
-
-/// The regions of one judgement of the stack, back to front, as the window walk treats them.
-struct Walk {
-    TVLRegion overlap;
-    TVLRegion visible;
-    TVLRegion sharedWindow;
-    TVLRegion applications;
-
-    void Reset() {
-        for (TVLRegion* region : {&overlap, &visible, &sharedWindow, &applications})
-            region->SetRectRgn(0, 0, 0, 0);
-    }
-    void Keep(const TVLRect& window) {
-        visible.AddRect(window);
-        sharedWindow.AddRect(window);
-        overlap.ExcludeRect(window);
-        applications.AddRect(window);
-    }
-    void Hide(const TVLRect& window) {
-        TVLRegion hidden;
-        hidden.AddRect(window);
-        hidden.CombineRgn(visible, REGION_COMBINE_AND);
-        overlap.CombineRgn(hidden, REGION_COMBINE_OR);
-        visible.CombineRgn(hidden, REGION_COMBINE_DIFF);
-    }
-    void ClipTo(const TVLRegion& display) {
-        for (TVLRegion* region : {&visible, &sharedWindow, &overlap})
-            region->CombineRgn(display, REGION_COMBINE_AND);
-    }
-    std::size_t CountRects() const {
-        std::vector<TVLRect> rects;
-        for (const TVLRegion* region : {&overlap, &visible, &sharedWindow, &applications})
-            region->GetRects(rects);
-        return rects.size();
-    }
-};
-
-/// Every second window is kept.
-void BM_Walk(benchmark::State& state, const WindowSizes& sizes) {
-    const std::vector<TVLRect> windows = ScatteredWindows(Count(state), sizes);
-    TVLRegion display;
-    display.AddRect(kDesktop);
-    Walk walk;
-    for ([[maybe_unused]] const auto turn : state) {
-        walk.Reset();
-        bool isKept = false;
-        for (const TVLRect& window : windows) {
-            isKept = !isKept;
-            isKept ? walk.Keep(window) : walk.Hide(window);
-        }
-        walk.ClipTo(display);
-    }
-    state.counters["rects"] = static_cast<double>(walk.CountRects());
-    state.counters["s_per_window"] =
-        benchmark::Counter(static_cast<double>(windows.size()),
-                           benchmark::Counter::kIsIterationInvariantRate | benchmark::Counter::kInvert);
-}
-
-BENCHMARK_CAPTURE(BM_Walk, windows, kWindows)
-    ->RangeMultiplier(10)
-    ->Range(10, 1000)
-    ->Unit(benchmark::kMicrosecond);
-BENCHMARK_CAPTURE(BM_Walk, small_windows, kSmallWindows)
-    ->RangeMultiplier(10)
-    ->Range(10, 1000)
-    ->Unit(benchmark::kMicrosecond);
 
 } // namespace

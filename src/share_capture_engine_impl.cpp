@@ -2,6 +2,7 @@
 #include "src/share_capture_engine_impl.h"
 
 #include "src/app_share_config.h"
+#include "src/mac/share_capturer_context_mac.h"
 #include "src/share_engine_factories.h"
 #include "src/share_frame.h"
 #include "util/cm_trace.h"
@@ -58,7 +59,7 @@ void ShareCaptureCounters::Load(SHARE_CAPTURE_STATISTIC& statistic) const {
 
 CShareCaptureEngine::CShareCaptureEngine() : m_sinkPort(std::make_shared<ShareSinkPort>()) {
     UseShareLib();
-    m_spShareCapturerContext = std::make_shared<ShareCapturerContext>();
+    m_spShareCapturerContext = MakeShareCapturerContext();
     m_pISharePointing = CreateSharePointing(SHARE_POINTING_TYPE_MOUSE, SHARE_INVALID_DISPLAY);
     m_pShareFrameA = NewFrame();
     m_pShareFrameB = NewFrame();

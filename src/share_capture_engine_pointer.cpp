@@ -1,8 +1,9 @@
 // SPDX-License-Identifier: Apache-2.0
 #include "src/share_capture_engine_pass.h"
-#include "src/share_graphic_util.h"
 #include "src/share_image_save.h"
 #include "src/share_util.h"
+
+#include <screenshare/share_graphic_util.h>
 
 #include <string>
 

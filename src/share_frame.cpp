@@ -238,6 +238,11 @@ int CShareFrame::_GetBackedDataLen() const {
     return std::min(_GetFrameDataLen(), m_nBufLen);
 }
 
+int CShareFrame::BackedDataLen(IShareFrame& frame) {
+    const auto* const ours = dynamic_cast<const CShareFrame*>(&frame);
+    return std::max(ours != nullptr ? ours->_GetBackedDataLen() : frame.GetFrameDataLen(), 0);
+}
+
 bool CShareFrame::HasSameData(CShareFrame& other) {
     const int len = _GetBackedDataLen();
     if (_GetFrameDataLen() != other._GetFrameDataLen() || len != other._GetBackedDataLen()) {

@@ -62,6 +62,10 @@ public:
     /// Reset the geometry of a frame may ask for more than its memory holds.
     bool HasSameData(CShareFrame& other);
 
+    /// How much of its data length a frame has memory for, in bytes: after a Reset that may be less than all.
+    /// Others than ours answer for their figures.
+    static int BackedDataLen(IShareFrame& frame);
+
     void SetMetaInfo(const MetaInfo& info) override { m_metaInfo = info; }
     MetaInfo GetMetaInfo() const override { return m_metaInfo; }
 

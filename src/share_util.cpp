@@ -1,8 +1,12 @@
 // SPDX-License-Identifier: Apache-2.0
 #include "src/share_util.h"
 
+#include "platform/window_services.h"
+#include "src/mac/share_util_mac.h"
 #include "util/cm_clock.h"
+#include "util/cm_thread.h"
 
+#include <algorithm>
 #include <cstdint>
 
 int ShareUtil::Extent(int from, int to) {
@@ -11,6 +15,45 @@ int ShareUtil::Extent(int from, int to) {
 
 int ShareUtil::Sum(int a, int b) {
     return static_cast<int>(static_cast<std::uint32_t>(a) + static_cast<std::uint32_t>(b));
+}
+
+int ShareUtil::Area(const TVLRect& rect) {
+    return static_cast<int>(static_cast<std::uint32_t>(Extent(rect.left, rect.right)) *
+                            static_cast<std::uint32_t>(Extent(rect.top, rect.bottom)));
+}
+
+TVLRect ShareUtil::Intersect(const TVLRect& a, const TVLRect& b) {
+    const TVLRect common{std::max(a.left, b.left), std::max(a.top, b.top), std::min(a.right, b.right),
+                         std::min(a.bottom, b.bottom)};
+    return common.left < common.right && common.top < common.bottom ? common : TVLRect{};
+}
+
+unsigned ShareUtil::GetPIDOfWindowHandle(unsigned window) {
+    const platform::CGSConnectionID connection = platform::CGSDefaultConnection();
+    platform::CGSConnectionID owner = 0;
+    pid_t pid = 0;
+    if (platform::CGSGetWindowOwner(connection, window, &owner) != platform::kCGErrorSuccess ||
+        platform::CGSConnectionGetPID(owner, &pid) != platform::kCGErrorSuccess)
+        return SHARE_INVALID_PROCESS;
+    return static_cast<unsigned>(pid);
+}
+
+void ShareUtil::GetWindowRect(unsigned window, TVLRect& rect) {
+    platform::CGRect frame;
+    platform::CGSGetScreenRectForWindow(platform::CGSDefaultConnection(), window, &frame);
+    rect = ShareUtilMac::CGRectToTVLRect(frame);
+}
+
+unsigned ShareUtil::GetCurrentPID() {
+    return CmProcessId();
+}
+
+unsigned ShareUtil::GetAppDisplayID(unsigned pid) {
+    return ::GetAppDisplayID(static_cast<int>(pid));
+}
+
+unsigned ShareUtil::GetWindowDisplayID(unsigned window) {
+    return ::GetWindowDisplayID(window);
 }
 
 std::string ShareUtil::TVLRectToString(const TVLRect& rect) {

@@ -86,6 +86,10 @@ CmThreadId GetThreadSelfId() {
     return self;
 }
 
+unsigned CmProcessId() {
+    return static_cast<unsigned>(getpid());
+}
+
 ACmThread::ACmThread() = default;
 
 ACmThread::~ACmThread() {

@@ -19,6 +19,9 @@ using CmThreadId = unsigned long;
 /// The id of the calling thread.
 CmThreadId GetThreadSelfId();
 
+/// The id of this process; in a forked child that of the child.
+unsigned CmProcessId();
+
 /// Reserved: no thread of this library has a reactor.
 class ICmReactor;
 

@@ -2,44 +2,12 @@
 #include "src/share_region.h"
 
 #include "tests/src/share_region_tools.h"
+#include "tests/support/memory_failure.h"
 
 #include <gtest/gtest.h>
 
-#include <cstddef>
-#include <cstdlib>
-#include <new>
 #include <string>
 #include <utility>
-
-namespace {
-
-/// While set, this thread finds no memory.
-thread_local bool isMemoryGone = false;
-
-void* Allocate(std::size_t size) noexcept {
-    return isMemoryGone ? nullptr : std::malloc(size);
-}
-
-} // namespace
-
-// Never inlined: next to an allocation that was not, the compiler would take them for a mismatch.
-[[gnu::noinline]] void* operator new(std::size_t size) {
-    if (void* const block = Allocate(size))
-        return block;
-    throw std::bad_alloc();
-}
-[[gnu::noinline]] void* operator new(std::size_t size, const std::nothrow_t&) noexcept {
-    return Allocate(size);
-}
-[[gnu::noinline]] void operator delete(void* block) noexcept {
-    std::free(block);
-}
-[[gnu::noinline]] void operator delete(void* block, std::size_t) noexcept {
-    std::free(block);
-}
-[[gnu::noinline]] void operator delete(void* block, const std::nothrow_t&) noexcept {
-    std::free(block);
-}
 
 namespace {
 

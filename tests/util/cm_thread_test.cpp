@@ -364,3 +364,14 @@ TEST(ACmThread, OfTheParentDoesNotHoldUpAForkedChild) {
     EXPECT_EQ(waitpid(child, &status, 0), child);
     EXPECT_TRUE(WIFEXITED(status) && WEXITSTATUS(status) == 0);
 }
+
+TEST(CmProcessId, IsTheChildsOwnInAForkedProcess) {
+    EXPECT_EQ(CmProcessId(), static_cast<unsigned>(getpid()));
+    const pid_t child = fork();
+    ASSERT_NE(child, -1);
+    if (child == 0)
+        _exit(CmProcessId() == static_cast<unsigned>(getpid()) ? 0 : 1);
+    int status = -1;
+    EXPECT_EQ(waitpid(child, &status, 0), child);
+    EXPECT_TRUE(WIFEXITED(status) && WEXITSTATUS(status) == 0);
+}

@@ -1,0 +1,235 @@
+// SPDX-License-Identifier: Apache-2.0
+#include "src/mac/share_capturer_context_mac.h"
+
+#include "platform/window_services.h"
+#include "src/app_share_config.h"
+#include "src/mac/share_util_mac.h"
+#include "src/share_dump_time_usage.h"
+#include "src/share_util.h"
+#include "util/cm_trace.h"
+
+#include <algorithm>
+
+/// The walk over the windows. The display tables are in share_capturer_context_mac_displays.cpp.
+
+namespace {
+
+using Guard = std::lock_guard<std::recursive_mutex>;
+
+bool IsFlat(const TVLRect& rect) {
+    return rect.left == rect.right || rect.top == rect.bottom;
+}
+
+/// Keeps menu bars, and what lies in one, out of shares that are cut out by windows. It only knows the bars
+/// that the walk has met so far: a window behind one is judged before.
+class MenuBarRule {
+public:
+    /// Whether a window is kept, given the verdict of the lists.
+    bool IsKept(const TVLRect& window, int level, bool isShared,
+                const std::map<unsigned, TVLRect>& displays) {
+        if (level == platform::CGWindowLevelForKey(platform::kCGMainMenuWindowLevelKey)) {
+            if (!StartsADisplay(window, displays))
+                return isShared;
+            m_menuBars.push_back(window);
+            return false;
+        }
+        return isShared && std::none_of(m_menuBars.begin(), m_menuBars.end(), [&](const TVLRect& bar) {
+                   return !IsFlat(bar) && ShareUtil::Intersect(bar, window) == window;
+               });
+    }
+
+private:
+    static bool StartsADisplay(const TVLRect& window, const std::map<unsigned, TVLRect>& displays) {
+        return std::any_of(displays.begin(), displays.end(), [&](const auto& display) {
+            return display.second.left == window.left && display.second.top == window.top;
+        });
+    }
+
+    std::vector<TVLRect> m_menuBars;
+};
+
+} // namespace
+
+/// What holds for the whole of one walk, whatever a client changes meanwhile.
+struct ShareCapturerContextMac::Walk {
+    platform::CGSConnectionID connection = 0;
+    SHARE_TYPE shareType = SHARE_TYPE_DESKTOP;
+    bool excludesMenuBars = false;
+    std::vector<unsigned> displays;
+    TVLRegion rgnDisplay;
+    MenuBarRule menuBars;
+    bool isWhole = true; // false once a region could not be changed for want of memory
+
+    void Need(bool done) { isWhole = isWhole && done; }
+    bool IsDesktop() const { return shareType == SHARE_TYPE_DESKTOP; }
+};
+
+struct ShareCapturerContextMac::WalkedWindow {
+    unsigned id = SHARE_INVALID_WINDOW;
+    bool bShared = false;
+    int winLevel = -1;
+    TVLRect rcWindow{};
+
+    bool IsDock() const { return winLevel == platform::CGWindowLevelForKey(platform::kCGDockWindowLevelKey); }
+};
+
+int ShareCapturerContextMac::UpdateShareCapturerContext() {
+    const unsigned flags = AppShareConfig::Instance()->m_nShareConfigFlags;
+    if ((flags & SHARE_CONFIG_FLAG_NO_WINDOW_WALK) != 0)
+        return SHARE_RESULT_OK;
+    ShareDumpTimeUsage total;
+    ShareDumpTimeUsage step;
+    Walk walk = _BeginWalk();
+    std::vector<int> windows;
+    ShareUtilMac::GetOnScreenWindowList(windows);
+    CmTraceDetail("ShareCapturerContextMac::UpdateShareCapturerContext begin >> WindowsCount=",
+                  windows.size());
+    CmTraceDetail("UpdateShareCapturerContext init usageTime=", step.Stop());
+
+    CmTraceDetail("check windows: start >> ");
+    m_paramSet.reset();
+    m_nTopAppWindow = SHARE_INVALID_WINDOW;
+    for (auto window = windows.rbegin(); window != windows.rend(); ++window)
+        _WalkWindow(walk, static_cast<unsigned>(*window));
+    step.Start();
+
+    if (!walk.IsDesktop()) {
+        _HideDocks(walk);
+        CmTraceDetail("UpdateShareCapturerContext exclude dockbar usageTime=", step.Stop());
+    }
+    std::reverse(m_paramSet.vCapturedWindows.begin(), m_paramSet.vCapturedWindows.end());
+    CmTraceDetail("UpdateShareCapturerContext reverse overlap windows usageTime=", step.Stop());
+    _UniteKept(walk);
+    _ClipToDisplays(walk);
+    if (!walk.isWhole)
+        _ShowNothing();
+    _UpdateAppsDisplay(m_paramSet);
+    CmTraceDetail("UpdateShareCapturerContext _UpdateAppsDisplay windows usageTime=", step.Stop());
+    _CommitParamSet(m_paramSet);
+    _TraceFound();
+    if ((flags & SHARE_CONFIG_FLAG_PERFORMANCE_TRACE) != 0)
+        CmTraceInfo("[Performance] UpdateShareCapturerContext total usageTime=", total.Stop());
+    return SHARE_RESULT_FAILED;
+}
+
+ShareCapturerContextMac::Walk ShareCapturerContextMac::_BeginWalk() const {
+    Walk walk;
+    walk.connection = platform::CGSDefaultConnection();
+    walk.shareType = m_eShareType;
+    walk.excludesMenuBars = !walk.IsDesktop() && !m_bNoWindowBaseArea && m_bExcludeMenuBar;
+    const Guard lock(m_displayLock);
+    walk.displays = m_vSharedDisplays;
+    walk.rgnDisplay.CopyRgn(m_rgnDisplay);
+    return walk;
+}
+
+void ShareCapturerContextMac::_WalkWindow(Walk& walk, unsigned id) {
+    WalkedWindow window;
+    window.id = id;
+    window.bShared = __IsWindowShared(id);
+    platform::CGSGetWindowLevel(walk.connection, id, &window.winLevel);
+    if (!walk.IsDesktop() && (window.IsDock() || ShareUtilMac::need_skip_window(id, window.winLevel))) {
+        CmTraceDetail("check windows:", ",bShared=", window.bShared, ",oneWindow=", id,
+                      ",winLevel=", window.winLevel, ",Skip");
+        return;
+    }
+    platform::CGRect frame;
+    platform::CGSGetScreenRectForWindow(walk.connection, id, &frame);
+    window.rcWindow = ShareUtilMac::CGRectToTVLRect(frame);
+
+    bool isKept = window.bShared;
+    if (walk.excludesMenuBars)
+        isKept = walk.menuBars.IsKept(window.rcWindow, window.winLevel, isKept, m_mapAppDisplayRects);
+    if (isKept)
+        _KeepWindow(walk, window);
+    else
+        _KeepOutWindow(walk, window);
+    _TraceWindow(window);
+}
+
+void ShareCapturerContextMac::_KeepWindow(Walk& walk, WalkedWindow& window) {
+    if (window.winLevel == 0)
+        m_nTopAppWindow = window.id;
+    m_paramSet.vCapturedWindows.push_back(window.id);
+    // The Dock's window is larger than what it draws.
+    if (walk.IsDesktop() && window.IsDock() && !walk.displays.empty())
+        window.rcWindow = ShareUtilMac::CGRectToTVLRect(ShareUtilMac::GetDockBarRect(walk.displays.front()));
+    walk.Need(m_paramSet.rgnVisible.AddRect(window.rcWindow));
+    walk.Need(m_paramSet.rgnOverlap.ExcludeRect(window.rcWindow));
+}
+
+void ShareCapturerContextMac::_KeepOutWindow(Walk& walk, const WalkedWindow& window) {
+    m_paramSet.vCapturedExcludedWindows.push_back(window.id);
+    TVLRegion hidden;
+    walk.Need(hidden.AddRect(window.rcWindow));
+    walk.Need(hidden.CombineRgn(m_paramSet.rgnVisible, REGION_COMBINE_AND));
+    if (hidden.IsEmpty())
+        return;
+    float alpha = 1.0F;
+    platform::CGSGetWindowAlpha(walk.connection, window.id, &alpha);
+    if (alpha > 0)
+        _HideVisible(walk, hidden);
+}
+
+void ShareCapturerContextMac::_HideVisible(Walk& walk, const TVLRegion& hidden) {
+    walk.Need(m_paramSet.rgnOverlap.CombineRgn(hidden, REGION_COMBINE_OR));
+    walk.Need(m_paramSet.rgnVisible.CombineRgn(hidden, REGION_COMBINE_DIFF));
+}
+
+void ShareCapturerContextMac::_HideDocks(Walk& walk) {
+    for (const unsigned display : walk.displays) {
+        TVLRegion hidden;
+        walk.Need(hidden.AddRect(ShareUtilMac::CGRectToTVLRect(ShareUtilMac::GetDockBarRect(display))));
+        walk.Need(hidden.CombineRgn(m_paramSet.rgnVisible, REGION_COMBINE_AND));
+        _HideVisible(walk, hidden);
+    }
+}
+
+void ShareCapturerContextMac::_UniteKept(Walk& walk) {
+    TVLRegion& kept = m_paramSet.rgnApplications;
+    kept.CopyRgn(m_paramSet.rgnVisible);
+    walk.Need(kept.CombineRgn(m_paramSet.rgnOverlap, REGION_COMBINE_OR));
+    m_paramSet.rgnSharedWindow.CopyRgn(kept);
+}
+
+void ShareCapturerContextMac::_ClipToDisplays(Walk& walk) {
+    for (TVLRegion* region : {&m_paramSet.rgnVisible, &m_paramSet.rgnSharedWindow, &m_paramSet.rgnOverlap})
+        walk.Need(region->CombineRgn(walk.rgnDisplay, REGION_COMBINE_AND));
+}
+
+void ShareCapturerContextMac::_ShowNothing() {
+    CmTraceError("ShareCapturerContextMac::UpdateShareCapturerContext fail no memory for the regions");
+    m_paramSet.reset();
+}
+
+// ---- Traces: a region's text costs more than the region, so it is made only for who reads it.
+
+void ShareCapturerContextMac::_TraceWindow(const WalkedWindow& window) const {
+    if (!CmTraceOn(CM_TRACE_DETAIL))
+        return;
+    CmTraceDetail("check windows:", ",bShared=", window.bShared, ",oneWindow=", window.id,
+                  ",winLevel=", window.winLevel, ",rcWindow=", ShareUtil::TVLRectToString(window.rcWindow));
+    CmTraceDetail("check windows:m_rgnOverlap=", m_paramSet.rgnOverlap.ToString());
+    CmTraceDetail("UpdateShareCapturerContext check one window's region, share=", window.bShared);
+}
+
+void ShareCapturerContextMac::_TraceFound() const {
+    if (!CmTraceOn(CM_TRACE_DETAIL))
+        return;
+    // The lists have changed places with the published ones, the regions have been copied.
+    std::vector<unsigned> captured;
+    std::vector<unsigned> excluded;
+    {
+        const Guard lock(m_paramLock);
+        captured = m_vCapturedWindows;
+        excluded = m_vCapturedExcludedWindows;
+    }
+    constexpr const char* WALK = "ShareCapturerContextMac::UpdateShareCapturerContext";
+    CmTraceDetail(WALK, ",m_rgnVisible=", m_paramSet.rgnVisible.ToString());
+    CmTraceDetail(WALK, ",m_rgnApplications=", m_paramSet.rgnApplications.ToString());
+    CmTraceDetail(WALK, ",m_rgnOverlap=", m_paramSet.rgnOverlap.ToString());
+    CmTraceDetail(WALK, ",m_rgnSharedWindow=", m_paramSet.rgnSharedWindow.ToString());
+    CmTraceDetail(WALK, ",m_vCapturedWindows.count=", captured.size(),
+                  ",m_vCapturedExcludedWindows=", excluded.size());
+    CmTraceDetail("ShareCapturerContextMac::UpdateShareCapturerContext end <<");
+}

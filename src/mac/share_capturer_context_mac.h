@@ -1,0 +1,51 @@
+// SPDX-License-Identifier: Apache-2.0
+#pragma once
+
+#include "src/share_capturer_context.h"
+
+#include <memory>
+
+/// The context that looks at the desktop: it walks the window server's list and finds out what a viewer may
+/// see.
+///
+/// Walk:    from the back of the stack to the front each window is judged. A kept one is added to what is
+///          visible; any other takes what it covers away from it, and what was taken is overlap: shared, but
+///          hidden.
+/// Threads: those of the base; one walk at a time. A walk holds no lock while it looks at windows, so a list
+///          change may be seen from its middle on; the next walk puts that right.
+/// Errors:  a window server that fails, or a window that goes away meanwhile, stops no walk: levels are then
+///          -1, rectangles empty and windows opaque. A walk that runs out of memory publishes that nothing is
+///          shared, with a trace at ERROR.
+class ShareCapturerContextMac : public ShareCapturerContext {
+public:
+    /// -1 when it has walked; 0 when SHARE_CONFIG_FLAG_NO_WINDOW_WALK keeps it from walking, and all stays as
+    /// it was.
+    int UpdateShareCapturerContext() override;
+
+    /// Always 0. The scale of the last shared display becomes that of the process.
+    int InitDisplays() override;
+
+private:
+    struct Walk;
+    struct WalkedWindow;
+
+    Walk _BeginWalk() const;
+    void _WalkWindow(Walk& walk, unsigned window);
+    void _KeepWindow(Walk& walk, WalkedWindow& window);
+    void _KeepOutWindow(Walk& walk, const WalkedWindow& window);
+    /// Makes overlap of a part of the visible region.
+    void _HideVisible(Walk& walk, const TVLRegion& hidden);
+    void _HideDocks(Walk& walk);
+    /// What the kept windows cover is what is seen of them and what is hidden of them. Joined once at the end
+    /// and not window by window: regions are what a walk takes its time for.
+    void _UniteKept(Walk& walk);
+    void _ClipToDisplays(Walk& walk);
+    /// For a walk that lost sight of what is hidden: its results would show what must not be seen.
+    void _ShowNothing();
+
+    void _TraceWindow(const WalkedWindow& window) const;
+    void _TraceFound() const;
+};
+
+/// The context for whoever has been handed none.
+std::shared_ptr<ShareCapturerContext> MakeShareCapturerContext();
