@@ -25,13 +25,13 @@ function(screenshare_label_needs LABEL) # PROGRAM...
     add_dependencies(${LABEL}_test_programs ${ARGN})
 endfunction()
 
-# screenshare_add_tests(LABEL label [LAYER target] SOURCES pattern...)
+# screenshare_add_tests(LABEL label [PROGRAM name] [LAYER target] SOURCES pattern...)
 #
-# One test program, LABEL_tests, of every file that a pattern (relative to the current folder) matches, linked with the
-# layer that it tests (by default the whole library). Each of its cases becomes a CTest test of its own, in a process
-# and a debug folder of its own, under that label. A label whose files do not exist yet makes no program.
+# One test program, by default LABEL_tests, of every file that a pattern (relative to the current folder) matches, linked
+# with the layer that it tests (by default the whole library). Each of its cases becomes a CTest test of its own, in a
+# process and a debug folder of its own, under that label. A label whose files do not exist yet makes no program.
 function(screenshare_add_tests)
-    cmake_parse_arguments(PARSE_ARGV 0 ARG "" "LABEL;LAYER" "SOURCES")
+    cmake_parse_arguments(PARSE_ARGV 0 ARG "" "LABEL;PROGRAM;LAYER" "SOURCES")
     list(TRANSFORM ARG_SOURCES PREPEND "${CMAKE_CURRENT_SOURCE_DIR}/" OUTPUT_VARIABLE patterns)
     file(GLOB sources CONFIGURE_DEPENDS ${patterns})
     if(NOT sources)
@@ -41,7 +41,10 @@ function(screenshare_add_tests)
     if(NOT ARG_LAYER)
         set(ARG_LAYER screenshare_core)
     endif()
-    set(program ${ARG_LABEL}_tests)
+    if(NOT ARG_PROGRAM)
+        set(ARG_PROGRAM ${ARG_LABEL}_tests)
+    endif()
+    set(program ${ARG_PROGRAM})
     add_executable(${program} ${sources})
     target_link_libraries(${program} PRIVATE screenshare_tests_support ${ARG_LAYER})
     target_precompile_headers(${program} REUSE_FROM screenshare_tests_support)
@@ -62,12 +65,12 @@ function(screenshare_add_tests)
         PROPERTIES LABELS ${ARG_LABEL} ${sanitizer_properties})
 endfunction()
 
-# screenshare_add_script_tests(LABEL label SCRIPT file PROGRAMS target...)
+# screenshare_add_script_tests(LABEL label SCRIPT file PROGRAMS target... [ARGUMENTS argument...])
 #
-# A CTest test for each function case_NAME of a shell script, which is called with the programs and NAME, and ends
-# with 77 when the machine lacks what the case needs.
+# A CTest test for each function case_NAME of a shell script, which is called with the programs' files, the arguments
+# and NAME, and ends with 77 when the machine lacks what the case needs.
 function(screenshare_add_script_tests)
-    cmake_parse_arguments(PARSE_ARGV 0 ARG "" "LABEL;SCRIPT" "PROGRAMS")
+    cmake_parse_arguments(PARSE_ARGV 0 ARG "" "LABEL;SCRIPT" "PROGRAMS;ARGUMENTS")
     screenshare_label_needs(${ARG_LABEL} ${ARG_PROGRAMS})
     list(TRANSFORM ARG_PROGRAMS REPLACE "(.+)" "$<TARGET_FILE:\\1>" OUTPUT_VARIABLE program_files)
     cmake_path(GET ARG_SCRIPT STEM suite)
@@ -76,8 +79,22 @@ function(screenshare_add_script_tests)
     foreach(line IN LISTS functions)
         string(REGEX REPLACE "^case_([a-z0-9_]+).*" "\\1" case "${line}")
         add_test(NAME ${suite}.${case}
-            COMMAND ${CMAKE_CURRENT_SOURCE_DIR}/${ARG_SCRIPT} ${program_files} ${case})
+            COMMAND ${CMAKE_CURRENT_SOURCE_DIR}/${ARG_SCRIPT} ${program_files} ${ARG_ARGUMENTS} ${case})
         set_tests_properties(${suite}.${case} PROPERTIES
             LABELS ${ARG_LABEL} SKIP_RETURN_CODE 77 ${sanitizer_properties})
     endforeach()
+endfunction()
+
+# screenshare_add_corpus_test(LABEL label FUZZER name)
+#
+# A CTest test that hands the seeds fuzz/corpus/NAME to the fuzzer fuzz/NAME_fuzz.cpp, without a fuzzing compiler.
+function(screenshare_add_corpus_test)
+    cmake_parse_arguments(PARSE_ARGV 0 ARG "" "LABEL;FUZZER" "")
+    set(program ${ARG_FUZZER}_replay)
+    add_executable(${program} fuzz/replay.cpp fuzz/${ARG_FUZZER}_fuzz.cpp)
+    target_include_directories(${program} PRIVATE ${PROJECT_SOURCE_DIR})
+    target_link_libraries(${program} PRIVATE screenshare_core)
+    screenshare_label_needs(${ARG_LABEL} ${program})
+    add_test(NAME ${program} COMMAND ${program} ${CMAKE_CURRENT_SOURCE_DIR}/fuzz/corpus/${ARG_FUZZER})
+    set_tests_properties(${program} PROPERTIES LABELS ${ARG_LABEL} ${sanitizer_properties})
 endfunction()

@@ -1,21 +1,22 @@
 // SPDX-License-Identifier: Apache-2.0
+#include "platform/platform_life.h"
 #include "src/app_share_config.h"
 #include "src/share_capture_engine_impl.h"
 #include "src/share_capture_engine_kinds.h"
-#include "src/share_engine_factories.h"
+#include "util/cm_guarded_call.h"
 #include "util/cm_trace.h"
 
 #include <screenshare/share_engine.h>
 
 #include <cstring>
-#include <exception>
-#include <memory>
 #include <mutex>
+
+/// The exported functions of the library's use, of engines and of settings.
 
 namespace {
 
-/// How many hold the library: the client and each engine. It marks the first one in and the last one out;
-/// nothing is built up or torn down by it.
+/// How many hold the library: the client and each engine. It marks the first one in and the last one out. No
+/// object of the system is built up or torn down by it; only the platform's threads end with the last one.
 class UseCount {
 public:
     void Add() {
@@ -24,11 +25,19 @@ public:
             CmTraceInfo("InitShareLib");
     }
 
-    /// One release too many leaves the count at all bits set, and the next use at 0 again.
-    void Subtract() {
+    /// True for the last one out. One release too many leaves the count at all bits set, and the next use at
+    /// 0 again.
+    bool Subtract() {
         const std::lock_guard<std::mutex> lock(m_mutex);
-        if (m_count-- == 1)
-            CmTraceInfo("UninitShareLib");
+        if (m_count-- != 1)
+            return false;
+        CmTraceInfo("UninitShareLib");
+        return true;
+    }
+
+    bool IsUsed() {
+        const std::lock_guard<std::mutex> lock(m_mutex);
+        return m_count != 0;
     }
 
 private:
@@ -62,17 +71,29 @@ void UseShareLib() {
 }
 
 void ReleaseShareLib() {
-    LibraryUse().Subtract();
+    if (!LibraryUse().Subtract())
+        return;
+    // Without the count's mutex: Rest waits for callbacks, and one of them may be making an engine.
+    platform::Rest();
+    if (LibraryUse().IsUsed())
+        platform::Wake();
+}
+
+int ShareEngineInit() {
+    UseShareLib();
+    return SHARE_RESULT_OK;
+}
+
+int ShareEngineUninit() {
+    ReleaseShareLib();
+    return SHARE_RESULT_OK;
 }
 
 IShareCaptureEngine* CreateShareCaptureEngine(SHARE_CAPTURE_ENGINE_TYPE type) {
     CmTraceInfo("[CreateShareCaptureEngine]>>eSHARE_CAPTURE_ENGINE_TYPE=", static_cast<int>(type));
-    try {
-        return BuildEngine(type);
-    } catch (const std::exception& error) {
-        CmTraceError("[CreateShareCaptureEngine]>>fail>>", error.what());
-        return nullptr;
-    }
+    IShareCaptureEngine* engine = nullptr;
+    CmCallGuarded("[CreateShareCaptureEngine]>>fail>>", [&] { engine = BuildEngine(type); });
+    return engine;
 }
 
 int DestroyShareCaptureEngine(IShareCaptureEngine* engine) {
@@ -80,11 +101,29 @@ int DestroyShareCaptureEngine(IShareCaptureEngine* engine) {
         return SHARE_RESULT_INVALID_PARAM;
     CmTraceInfo("[DestroyShareCaptureEngine]>>eSHARE_CAPTURE_ENGINE_TYPE=",
                 static_cast<int>(engine->GetCaptureEngineType()));
+    int result = SHARE_RESULT_FAILED;
+    CmCallGuarded("[DestroyShareCaptureEngine]>>fail>>", [&] { result = engine->Stop(); });
     // Stop refuses only where it would have to wait for itself; the engine then has to live on.
-    if (engine->Stop() != SHARE_RESULT_OK)
+    if (result != SHARE_RESULT_OK)
         return SHARE_RESULT_FAILED;
     delete engine;
     return SHARE_RESULT_OK;
+}
+
+int EnableScreenShareDump(bool bEnableScreenShareDump) {
+    CmTraceInfo("[EnableScreenShareDump]>>bEnableScreenShareDump=", bEnableScreenShareDump);
+    AppShareConfig::Instance()->m_bCaptureDumpData = bEnableScreenShareDump;
+    return SHARE_RESULT_OK;
+}
+
+int EnableChangeAeroMode(bool bEnableChangeAeroMode) {
+    CmTraceInfo("[EnableChangeAeroMode]>>bEnableChangeAeroMode=", bEnableChangeAeroMode);
+    AppShareConfig::Instance()->m_bChangeAeroMode = bEnableChangeAeroMode;
+    return SHARE_RESULT_OK;
+}
+
+int EnableScreenShareHWEncode() {
+    return SHARE_RESULT_NOT_SUPPORTED;
 }
 
 int ShareConfig(SHARE_CONFIG selector, const void* value, unsigned value_size) {
@@ -100,37 +139,5 @@ int ShareConfig(SHARE_CONFIG selector, const void* value, unsigned value_size) {
     unsigned flags = 0;
     std::memcpy(&flags, value, sizeof flags);
     AppShareConfig::Instance()->m_nShareConfigFlags = flags;
-    return SHARE_RESULT_OK;
-}
-
-IShareCapturer* CreateShareCapture(SHARE_CAPTURER_TYPE type, std::shared_ptr<ShareCapturerContext>&) {
-    CmTraceInfo("[CreateShareCapture]>>eSHARE_CAPTURER_TYPE=", static_cast<int>(type));
-    return nullptr;
-}
-
-int DestroyShareCapture(IShareCapturer* capturer) {
-    CmTraceInfo("[DestroyShareCapture]>>pIShareCapturer=", static_cast<const void*>(capturer));
-    if (capturer == nullptr)
-        return SHARE_RESULT_INVALID_PARAM;
-    delete capturer;
-    return SHARE_RESULT_OK;
-}
-
-std::shared_ptr<IShareCapturer> MakeOwnCapturer(SHARE_CAPTURER_TYPE type,
-                                                std::shared_ptr<ShareCapturerContext>& context) {
-    IShareCapturer* capturer = CreateShareCapture(type, context);
-    if (capturer == nullptr)
-        return nullptr;
-    return std::shared_ptr<IShareCapturer>(capturer, [](IShareCapturer* last) { DestroyShareCapture(last); });
-}
-
-ISharePointing* CreateSharePointing(SHARE_POINTING_TYPE type, unsigned baseDisplay) {
-    CmTraceDebug("CreateSharePointing(", static_cast<int>(type), ", ", baseDisplay, ")");
-    return nullptr;
-}
-
-int DestroySharePointing(ISharePointing* pointing) {
-    CmTraceInfo("DestroySharePointing(", static_cast<const void*>(pointing), ")");
-    delete pointing;
     return SHARE_RESULT_OK;
 }

@@ -23,9 +23,8 @@ enum SHARE_CAPTURE_RESULT : int {
 
 /// Hears what a capturer finds out. The engine is the sink of its capturer.
 ///
-/// Threads: called on whatever thread the capturer finds it out. A capturer calls no sink while it holds a
-/// lock that
-///          one of its own IShareCapturer operations takes.
+/// Threads: called on whatever thread the capturer finds it out. A capturer of a client's own calls no sink
+///          while it holds a lock that one of its IShareCapturer operations takes.
 /// Results: 0; capturers need not look at them.
 class IShareCapturerSink {
 public:

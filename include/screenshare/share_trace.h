@@ -15,8 +15,8 @@
 ///           are thinned out to the first and then each 100th, some to each 10th, and have another form:
 ///           "[UTIL] ERROR: what happened[ScreenShare],[Core]" with the place behind it. No line is longer
 ///           than 1023 bytes (what is longer is cut) or ends with a line break.
-/// Threads:  each function may be called from any thread, and none throws. Fork:     a forked process keeps
-///           threshold and receiver, and waits for none of the threads left behind.
+/// Threads:  each function may be called from any thread, and none throws.
+/// Fork:     a forked process keeps threshold and receiver, and waits for none of the threads left behind.
 
 /// Levels of lines. A line is written when its level is at most the threshold.
 enum SHARE_TRACE_LEVEL : int {
