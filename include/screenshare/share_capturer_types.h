@@ -31,7 +31,7 @@ enum SHARE_CONFIG : int {
 enum SHARE_WINDOW_ENUM_MODE : unsigned {
     SHARE_WINDOW_ENUM_NORMAL = 0,    ///< On screen, without the desktop's own windows and the dock.
     SHARE_WINDOW_ENUM_ON_SCREEN = 1, ///< The same with the dock.
-    SHARE_WINDOW_ENUM_ALL = 2,       ///< Those that are off the screen, too; any higher number means the same.
+    SHARE_WINDOW_ENUM_ALL = 2, ///< Those that are off the screen, too; any higher number means the same.
 };
 
 /// Hears of each window of a walk, on the thread that asked for it.

@@ -35,26 +35,26 @@ SCREENSHARE_API int DestroyShareCaptureEngine(IShareCaptureEngine* engine);
 /// points to four bytes whatever `value_size` says.
 SCREENSHARE_API int ShareConfig(SHARE_CONFIG selector, const void* value, unsigned value_size);
 
-/// The client's hold on the library, UseShareLib and ReleaseShareLib. Any ShareEngineUninit, not only the last
-/// one, ends the making of thumbnails for good. Always 0.
+/// The client's hold on the library, UseShareLib and ReleaseShareLib. Any ShareEngineUninit, not only the
+/// last one, ends the making of thumbnails for good. Always 0.
 SCREENSHARE_API int ShareEngineInit();
 SCREENSHARE_API int ShareEngineUninit();
 
-/// Builds a capturer on its own, a dummy when the debug file says so; null for a number that is no kind. End it
-/// with DestroyShareCapture, which gives -2 for null. The capturer keeps a share of the context.
+/// Builds a capturer on its own, a dummy when the debug file says so; null for a number that is no kind. End
+/// it with DestroyShareCapture, which gives -2 for null. The capturer keeps a share of the context.
 SCREENSHARE_API IShareCapturer* CreateShareCapture(SHARE_CAPTURER_TYPE type,
                                                    std::shared_ptr<ShareCapturerContext>& context);
 SCREENSHARE_API int DestroyShareCapture(IShareCapturer* capturer);
 
 /// Builds a list of what can be shared, empty until its Refresh; null for a number that is no kind. With
-/// `bWatchChanges` it follows the desktop and calls its sinks. End it with DestroyShareSourceEnumerator, -2 for
-/// null, and not from inside one of its events.
+/// `bWatchChanges` it follows the desktop and calls its sinks. End it with DestroyShareSourceEnumerator, -2
+/// for null, and not from inside one of its events.
 SCREENSHARE_API IShareSourceEnumerator* CreateShareSourceEnumerator(SHARE_SOURCE_ENUMERATOR_TYPE type,
                                                                     bool bWatchChanges);
 SCREENSHARE_API int DestroyShareSourceEnumerator(IShareSourceEnumerator* enumerator);
 
-/// Builds a pointing object; null for a number that is no kind. End it with DestroySharePointing, which gives 0
-/// for null, too.
+/// Builds a pointing object; null for a number that is no kind. End it with DestroySharePointing, which gives
+/// 0 for null, too.
 SCREENSHARE_API ISharePointing* CreateSharePointing(SHARE_POINTING_TYPE type, unsigned baseDisplay);
 SCREENSHARE_API int DestroySharePointing(ISharePointing* pointing);
 

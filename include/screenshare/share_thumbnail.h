@@ -19,8 +19,8 @@ struct ImageData {
 /// Lifetime: neither owned nor counted; CancelThumbnail it before it is destroyed.
 class ThumbnailCallback {
 public:
-    /// `failed`: there is no picture, the image is all zeros. `last`: the last item of the request. False ends
-    /// the request.
+    /// `failed`: there is no picture, the image is all zeros. `last`: the last item of the request. False
+    /// ends the request.
     virtual bool onAppThumbnail(unsigned pid, ImageData image, bool failed, bool last) = 0;
     virtual bool onWindowThumbnail(unsigned window, ImageData image, bool failed, bool last) = 0;
     /// -1: thumbnails can't be made at all. The result is not looked at.

@@ -5,7 +5,8 @@
 #include <cstdlib>
 #include <new>
 
-/// Has a thread find no memory. It replaces the operators of the whole program, so include it in one file of each.
+/// Has a thread find no memory. It replaces the operators of the whole program, so include it in one file of
+/// each.
 
 namespace {
 

@@ -166,7 +166,8 @@ TEST(FillFrame, LeavesAFrameAloneThatHasLessMemoryThanPixels) {
     frame->Reset();                                     // the lines are whole again, the memory is not
     ASSERT_EQ(frame->GetFrameDataLen(), WIDTH * HEIGHT * 4);
     EXPECT_EQ(ShareUtilMac::FillFrame(&*frame, COLOUR, nullptr), -1);
-    EXPECT_EQ(Bytes(frame->GetFrameData(), frame->GetFrameData() + WIDTH * 3 * HEIGHT), Bytes(WIDTH * 3 * HEIGHT, 0));
+    EXPECT_EQ(Bytes(frame->GetFrameData(), frame->GetFrameData() + WIDTH * 3 * HEIGHT),
+              Bytes(WIDTH * 3 * HEIGHT, 0));
 }
 
 TEST(FillFrame, KeepsToTheLinesOfTheFrame) {
