@@ -86,6 +86,10 @@ int RunEngine(const Options& options, X11Grabber& grabber) {
     Console console;
 
     UseShareLib();
+    EnableScreenShareDump(options.dump);
+    // An engine makes its pointing object before it reads the debug file. One that goes ahead has read it,
+    // and the next one gets the dummy pointer that the file may ask for.
+    DestroyShareCaptureEngine(CreateShareCaptureEngine(SHARE_CAPTURE_ENGINE_TYPE_USER_CUSTOMIZATION));
     IShareCaptureEngine* engine = CreateShareCaptureEngine(SHARE_CAPTURE_ENGINE_TYPE_USER_CUSTOMIZATION);
     if (engine == nullptr) {
         ReleaseShareLib();

@@ -14,6 +14,7 @@ const char* const usageText =
     "  --out DIR           where the files go; those of the same name are replaced (frames)\n"
     "  --every N           write every Nth frame only (1)\n"
     "  --check-duplicates  hold back frames that equal the one before\n"
+    "  --dump              have the library dump its frames, as the debug file says\n"
     "  --probe             capture nothing; say whether the display can be captured\n"
     "  --help              this text\n"
     "\n"
@@ -45,7 +46,8 @@ constexpr std::array<NumberOption, 4> numberOptions{{{"--seconds", &Options::sec
                                                      {"--every", &Options::every, 1000000}}};
 constexpr std::array<TextOption, 2> textOptions{
     {{"--display", &Options::display}, {"--out", &Options::directory}}};
-constexpr std::array<Switch, 3> switches{{{"--check-duplicates", &Options::checkDuplicates},
+constexpr std::array<Switch, 4> switches{{{"--check-duplicates", &Options::checkDuplicates},
+                                          {"--dump", &Options::dump},
                                           {"--probe", &Options::probe},
                                           {"--help", &Options::help}}};
 

@@ -13,6 +13,7 @@ struct Options {
     int every = 1;
     bool checkDuplicates = false;
     bool probe = false;
+    bool dump = false;
     bool help = false;
 };
 

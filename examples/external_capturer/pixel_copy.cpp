@@ -3,7 +3,6 @@
 
 #include <array>
 #include <cstddef>
-#include <cstring>
 
 namespace {
 
@@ -24,21 +23,18 @@ int CoverBegin(int index, int sourceLength, int targetLength) {
     return static_cast<int>(static_cast<std::int64_t>(index) * sourceLength / targetLength);
 }
 
-// As whole words, which the compiler makes many at a time.
-void CopyLine(const Source& source, const Target& target, int y, int alphaByte) {
+void CopyLine(const Source& source, const ColourBytes& order, const Target& target, int y) {
     const std::uint8_t* from = PixelAt(source, 0, y);
     std::uint8_t* to = PixelAt(target, 0, y);
-    std::uint32_t alpha = 0;
-    reinterpret_cast<std::uint8_t*>(&alpha)[alphaByte] = 255;
     for (int x = 0; x < target.width; ++x, from += pixelBytes, to += pixelBytes) {
-        std::uint32_t pixel = 0;
-        std::memcpy(&pixel, from, pixelBytes);
-        pixel |= alpha;
-        std::memcpy(to, &pixel, pixelBytes);
+        to[0] = from[order.red];
+        to[1] = from[order.green];
+        to[2] = from[order.blue];
+        to[3] = 255;
     }
 }
 
-void ShrinkPixel(const Source& source, const Target& target, int x, int y) {
+void ShrinkPixel(const Source& source, const ColourBytes& order, const Target& target, int x, int y) {
     const int left = CoverBegin(x, source.width, target.width);
     const int right = CoverBegin(x + 1, source.width, target.width);
     const int top = CoverBegin(y, source.height, target.height);
@@ -54,28 +50,31 @@ void ShrinkPixel(const Source& source, const Target& target, int x, int y) {
         }
     }
     const auto count = static_cast<std::uint64_t>(right - left) * static_cast<std::uint64_t>(bottom - top);
+    const auto mean = [&](int byte) {
+        return static_cast<std::uint8_t>(sums[static_cast<std::size_t>(byte)] / count);
+    };
     std::uint8_t* to = PixelAt(target, x, y);
-    for (std::size_t i = 0; i < sums.size(); ++i) {
-        to[i] = static_cast<std::uint8_t>(sums[i] / count);
-    }
+    to[0] = mean(order.red);
+    to[1] = mean(order.green);
+    to[2] = mean(order.blue);
+    to[3] = 255;
 }
 
-void ShrinkLine(const Source& source, const Target& target, int y, int alphaByte) {
+void ShrinkLine(const Source& source, const ColourBytes& order, const Target& target, int y) {
     for (int x = 0; x < target.width; ++x) {
-        ShrinkPixel(source, target, x, y);
-        PixelAt(target, x, y)[alphaByte] = 255;
+        ShrinkPixel(source, order, target, x, y);
     }
 }
 
 } // namespace
 
-void CopyOpaque(const Source& source, const Target& target, int alphaByte) {
+void CopyAsRgba(const Source& source, const ColourBytes& order, const Target& target) {
     const bool sameSize = source.width == target.width && source.height == target.height;
     for (int y = 0; y < target.height; ++y) {
         if (sameSize) {
-            CopyLine(source, target, y, alphaByte);
+            CopyLine(source, order, target, y);
         } else {
-            ShrinkLine(source, target, y, alphaByte);
+            ShrinkLine(source, order, target, y);
         }
     }
 }

@@ -12,8 +12,14 @@ struct PixelView {
     int height;
 };
 
-/// Copies a picture and makes it opaque: byte `alphaByte` of each pixel becomes 255. A smaller target gets
-/// the picture shrunk, each of its pixels the mean of those it covers. The target is at most as large as the
-/// source.
-void CopyOpaque(const PixelView<const std::uint8_t>& source, const PixelView<std::uint8_t>& target,
-                int alphaByte);
+/// Which byte of a source pixel holds which colour.
+struct ColourBytes {
+    int red;
+    int green;
+    int blue;
+};
+
+/// Copies a picture as red, green, blue and an alpha of 255. A smaller target gets the picture shrunk, each
+/// of its pixels the mean of those it covers. The target is at most as large as the source.
+void CopyAsRgba(const PixelView<const std::uint8_t>& source, const ColourBytes& order,
+                const PixelView<std::uint8_t>& target);

@@ -9,25 +9,18 @@
 
 namespace {
 
-struct FrameLayout {
-    SHARE_FRAME_FORMAT format;
-    int alphaByte;
-};
-
-// Frames have a format for each order that an X server may use, so no pixel is ever rearranged: the padding
-// byte becomes alpha, and that is all.
-FrameLayout LayoutFor(X11PixelOrder order) {
+ColourBytes ColoursOf(X11PixelOrder order) {
     switch (order) {
         case X11PixelOrder::RGBX:
-            return {SHARE_FRAME_FORMAT_RGBA, 3};
+            return {0, 1, 2};
         case X11PixelOrder::XRGB:
-            return {SHARE_FRAME_FORMAT_ARGB, 0};
+            return {1, 2, 3};
         case X11PixelOrder::XBGR:
-            return {SHARE_FRAME_FORMAT_ABGR, 0};
+            return {3, 2, 1};
         case X11PixelOrder::BGRX:
             break;
     }
-    return {SHARE_FRAME_FORMAT_BGRA, 3};
+    return {2, 1, 0};
 }
 
 // The largest size of the same shape inside the limit; never larger than the picture, never empty.
@@ -44,15 +37,15 @@ TVLSize FitInto(TVLSize picture, TVLSize limit) {
 }
 
 // False when the frame got no memory for the picture.
-bool FillFrame(IShareFrame& frame, const X11Picture& picture, TVLSize size, const FrameLayout& layout) {
+bool FillFrame(IShareFrame& frame, const X11Picture& picture, TVLSize size, const ColourBytes& order) {
     frame.Reset();
-    frame.SetFrameDataFormat(layout.format);
+    frame.SetFrameDataFormat(SHARE_FRAME_FORMAT_RGBA); // which the library can dump, too
     frame.SetFrameSize(size);
     if (frame.GetFrameData() == nullptr) {
         return false;
     }
-    CopyOpaque({picture.pixels, picture.lineBytes, picture.width, picture.height},
-               {frame.GetFrameData(), frame.GetFrameLineBytes(), size.cx, size.cy}, layout.alphaByte);
+    CopyAsRgba({picture.pixels, picture.lineBytes, picture.width, picture.height}, order,
+               {frame.GetFrameData(), frame.GetFrameLineBytes(), size.cx, size.cy});
 
     // Frames are used again and keep the stamp of their last picture; at 0 the engine puts a new one.
     frame.SetTimestamp(0);
@@ -81,7 +74,7 @@ int ScreenCapturer::Capture(IShareFrame* frame) {
     const TVLSize size{picture.width, picture.height};
     ReportSize(size);
     const bool filled =
-        FillFrame(*frame, picture, FitInto(size, m_maxSize), LayoutFor(m_grabber.GetPixelOrder()));
+        FillFrame(*frame, picture, FitInto(size, m_maxSize), ColoursOf(m_grabber.GetPixelOrder()));
     return filled ? SHARE_CAPTURE_OK : SHARE_CAPTURE_FAILED;
 }
 

@@ -150,6 +150,25 @@ case_refusals() {
     close_display
 }
 
+case_debug_file() {
+    open_display 320x240x24
+    export SCREENSHARE_DEBUG_DIR=$work/debug SCREENSHARE_TRACE=debug
+    mkdir -p -m 700 "$SCREENSHARE_DEBUG_DIR/img-dump"
+    cat >"$SCREENSHARE_DEBUG_DIR/share_config.json" <<'END'
+{ "dummy_point": true, "trace_one_by_frames": 1, "dump_raw_data_every_x_frames": 1, "dump_raw_data_ring_size": 2 }
+END
+    run --frames 4 --fps 20 --dump
+    expect_equal "exit code" 0 $?
+    expect_equal "dummy pointers" 1 "$(grep -c 'CreateSharePointing() create dummy object' "$work/err")"
+    expect_equal "dumped pictures" "0_combined.png 1_combined.png 2_combined.png" \
+        "$(cd "$SCREENSHARE_DEBUG_DIR/img-dump" && echo *)"
+    expect_equal "a dumped pixel" "320x240 #c02040ff" "$(pixel "$SCREENSHARE_DEBUG_DIR/img-dump/1_combined.png" 0 0)"
+    run --frames 2 --fps 20
+    expect_equal "dumps without --dump" 3 "$(find "$SCREENSHARE_DEBUG_DIR/img-dump" -type f -newer "$work/debug/share_config.json" | wc -l)"
+    unset SCREENSHARE_DEBUG_DIR SCREENSHARE_TRACE
+    close_display
+}
+
 case_commands() {
     open_display 640x480x24
     start --fps 10
