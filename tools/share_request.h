@@ -1,0 +1,22 @@
+// SPDX-License-Identifier: Apache-2.0
+#pragma once
+
+#include <optional>
+#include <string>
+#include <vector>
+
+/// What the command line asks to share and to keep out.
+struct ShareRequest {
+    std::optional<unsigned> monitor{};
+    std::vector<unsigned> apps{}; ///< Process ids.
+    std::vector<unsigned> windows{};
+    std::vector<unsigned> excludedApps{};
+    std::vector<unsigned> excludedWindows{};
+    /// Keeps menu bars, and what lies in one, out of a share of applications or windows.
+    bool excludesMenuBars = false;
+};
+
+/// The main monitor stands in for a request that names nothing to share.
+/// Gives what is wrong with the request on the desktop as it is now: an id that isn't there. Empty when
+/// nothing is.
+std::string CompleteRequest(ShareRequest& request);
