@@ -108,7 +108,7 @@ protected:
     }
 
     void GivePointer(IShareFrame* picture, int hotX, int hotY, int x, int y) {
-        m_image = new CFakePointingImg(m_bench->calls, picture, hotX, hotY);
+        m_image = new CFakePointingImg(m_imageCalls, picture, hotX, hotY);
         m_image->AddRef();
         m_bench->pointing->image = m_image;
         m_bench->pointing->x = x;
@@ -126,6 +126,7 @@ protected:
     static Colour ArrowAt(int x, int y) { return {x * 60, y * 80, 200, 255}; }
 
 private:
+    CCallLog m_imageCalls; // the image outlives the bench and its log
     CFakePointingImg* m_image = nullptr;
 };
 
