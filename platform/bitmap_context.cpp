@@ -116,7 +116,7 @@ bool IsFinite(const CGRect& rect) {
 // ---- Filling
 
 std::uint8_t ToByte(double component) {
-    return static_cast<std::uint8_t>(component * 255 + 0.5);
+    return static_cast<std::uint8_t>(std::lround(component * 255));
 }
 
 double Unit(CGFloat component) {

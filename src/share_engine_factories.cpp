@@ -4,6 +4,7 @@
 #include "src/app_share_config.h"
 #include "src/mac/app_enum_mac.h"
 #include "src/mac/monitor_enum_mac.h"
+#include "src/mac/share_capturer_desktop_mac.h"
 #include "src/share_capturer_dummy.h"
 #include "src/share_pointing_mouse.h"
 #include "src/share_source_dummy.h"
@@ -20,9 +21,12 @@ IShareCapturer* BuildCapturer(SHARE_CAPTURER_TYPE type,
     const bool isDummyWanted = AppShareConfig::Instance()->IsDummyCaptureEnabled();
     switch (type) {
         case SHARE_CAPTURER_TYPE_DESKTOP:
+            if (isDummyWanted)
+                return new CShareCapturerDummy(context);
+            return new CShareCapturerDesktopMac(context);
         case SHARE_CAPTURER_TYPE_APP:
         case SHARE_CAPTURER_TYPE_WINDOW:
-            // Nothing captures a real screen yet.
+            // Nothing captures single applications or windows yet.
             return isDummyWanted ? new CShareCapturerDummy(context) : nullptr;
         case SHARE_CAPTURER_TYPE_DUMMY:
             return new CShareCapturerDummy(context);

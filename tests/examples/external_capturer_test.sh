@@ -50,7 +50,7 @@ run() {
 
 # start ARGUMENT...: in the background; `say` types a line.
 start() {
-    rm -f "$work/input"
+    rm -f "$work/input" "$work/out" "$work/err" # what the run before has said is not said by this one
     mkfifo "$work/input"
     "$binary" --out "$work/frames" "$@" <"$work/input" >"$work/out" 2>"$work/err" &
     run_pid=$!
@@ -153,7 +153,7 @@ case_refusals() {
 case_debug_file() {
     open_display 320x240x24
     export SCREENSHARE_DEBUG_DIR=$work/debug SCREENSHARE_TRACE=debug
-    mkdir -p -m 700 "$SCREENSHARE_DEBUG_DIR/img-dump"
+    mkdir -p "$SCREENSHARE_DEBUG_DIR/img-dump"
     cat >"$SCREENSHARE_DEBUG_DIR/share_config.json" <<'END'
 { "dummy_point": true, "trace_one_by_frames": 1, "dump_raw_data_every_x_frames": 1, "dump_raw_data_ring_size": 2 }
 END

@@ -216,6 +216,7 @@ TEST_F(ShareCaptureStep, GoesOnAfterAFallbackThatLeftNoCapturer) {
     CEngineBench<CShareCaptureDesktopEngine> desktop(true);
     desktop.BeginInline();
     desktop.engine->m_eCaptureMode = MODE_7;
+    desktop.engine->m_eSHARE_CAPTURE_ENGINE_TYPE = static_cast<SHARE_CAPTURE_ENGINE_TYPE>(0); // has none
     desktop.capturer.SetResult(-7);
     desktop.Pass(3);
     EXPECT_EQ(desktop.Statistic().eCaptureMode, SCREEN_CAPTURER_TYPE_DEFAULT);

@@ -190,7 +190,7 @@ TEST(FailureOfAPass, FallsBackInsideThePassAndTellsNobody) {
 }
 
 TEST(FailureOfAPass, DestroysAnOwnCapturerAndGoesOnWithoutOne) {
-    CEngineBench<CShareCaptureDesktopEngine> bench;
+    CEngineBench<CShareCaptureAppEngine> bench;
     bench.BeginInline();
     auto* const own = new CFakeCapturer(bench.calls);
     bench.engine->GiveOwnCapturer(std::shared_ptr<IShareCapturer>(own));

@@ -84,11 +84,11 @@ TEST(ShareCaptureWindowEngine, IsClosedToAClientsCapturerAndPointer) {
 
 TEST(ShareCaptureDesktopEngine, DestroysItsCapturerBeforeTheRestOfItself) {
     CCallLog calls;
-    const CTraceLog trace;
     auto* const engine = new CEngineProbe<CShareCaptureDesktopEngine>;
     engine->GivePointing(new CFakePointing(calls));
     engine->GiveOwnCapturer(std::shared_ptr<IShareCapturer>(new CFakeCapturer(calls), DestroyShareCapture));
     calls.Clear();
+    const CTraceLog trace;
     EXPECT_EQ(DestroyShareCaptureEngine(engine), 0);
     EXPECT_EQ(calls.Calls(), (Lines{"capturer RemoveSink", "capturer deleted", "pointing RemoveSink",
                                     "pointing Stop", "pointing deleted"}));

@@ -1,0 +1,343 @@
+// SPDX-License-Identifier: Apache-2.0
+#include "src/mac/cgs_composition.h"
+
+#include "platform/core_graphics.h"
+#include "platform/window_services.h"
+#include "src/app_share_config.h"
+#include "src/mac/monitor_enum_mac.h"
+#include "src/mac/share_util_mac.h"
+#include "src/share_capturer_context.h"
+#include "src/share_dump_time_usage.h"
+#include "src/share_util.h"
+#include "util/cm_numeric.h"
+#include "util/cm_trace.h"
+
+#include <screenshare/share_capturer.h>
+#include <screenshare/share_frame.h>
+#include <screenshare/share_graphic_util.h>
+
+#include <sys/types.h>
+#include <algorithm>
+#include <cstring>
+
+namespace {
+
+constexpr int BLACK = 0;
+constexpr int BYTES_PER_PIXEL = 4;
+
+bool HasArea(const platform::CGRect& rect) {
+    return rect.size.width != 0 && rect.size.height != 0;
+}
+
+TVLSize PixelsOf(const platform::CGSize& points, float scale) {
+    return {CmTruncate(points.width * scale), CmTruncate(points.height * scale)};
+}
+
+void FillWhole(platform::CGContext* context, TVLSize size, int colour) {
+    float red = 0;
+    float green = 0;
+    float blue = 0;
+    ShareUtilMac::GetRGBfromInt(colour, red, green, blue);
+    platform::CGContextSetRGBFillColor(context, red, green, blue, 1.0F);
+    platform::CGContextFillRect(context,
+                                {{0, 0}, {static_cast<float>(size.cx), static_cast<float>(size.cy)}});
+}
+
+bool HasFlag(SHARE_CONFIG_FLAGS flag) {
+    return (AppShareConfig::Instance()->m_nShareConfigFlags & flag) != 0;
+}
+
+void TraceDrawing(ShareDumpTimeUsage& usage, const platform::CGWindowImage* image,
+                  const platform::CGRect& place) {
+    if (!HasFlag(SHARE_CONFIG_FLAG_PERFORMANCE_TRACE) || !CmTraceOn(CM_TRACE_INFO))
+        return;
+    CmTraceInfo("[Performance]CShareCGSCapturer.CGContextDrawImage usagetime=", usage.Stop(),
+                " image={w=", platform::CGWindowImageGetWidth(image),
+                " h=", platform::CGWindowImageGetHeight(image),
+                "} destRect=", ShareUtilMac::CGRectToString(place).c_str());
+}
+
+} // namespace
+
+struct CShareCGSCapturer::Pass {
+    TVLSize bitmap{};
+    TVLSize capture{};
+    platform::CGWindowImageRef image;
+    platform::CGRect imageRect; // what the image shows
+    platform::CGRect drawRect;  // what the frame shows
+    bool isDesktop = true;
+
+    /// Whether the image leaves nothing of what the frame held before.
+    bool CoversFrame() const {
+        return platform::CGWindowImageIsOpaque(image.get()) && capture.cx >= bitmap.cx &&
+               capture.cy >= bitmap.cy;
+    }
+};
+
+CShareCGSCapturer::CShareCGSCapturer(const std::shared_ptr<ShareCapturerContext>& context)
+    : m_shareCapturerContext(context),
+      m_nCapturedDisplayId(platform::CGMainDisplayID()),
+      m_fDisplayScale(CMonitorEnumMac::screenScaleFactorForDisplayID(m_nCapturedDisplayId)),
+      m_rectCapturedDisplay(platform::CGDisplayBounds(m_nCapturedDisplayId)) {}
+
+CShareCGSCapturer::~CShareCGSCapturer() = default;
+
+// ---- Sizes
+
+void CShareCGSCapturer::calcScreenSize(unsigned display, TVLSize max, platform::CGRect& rect, TVLSize& bitmap,
+                                       TVLSize& capture) {
+    const float scale = CMonitorEnumMac::screenScaleFactorForDisplayID(display);
+    const platform::CGSize points{static_cast<float>(platform::CGDisplayPixelsWide(display)),
+                                  static_cast<float>(platform::CGDisplayPixelsHigh(display))};
+    calcCaptureSize(PixelsOf(points, scale), max, bitmap, capture);
+    rect = platform::CGDisplayBounds(display);
+}
+
+void CShareCGSCapturer::calcCaptureSize(TVLSize source, TVLSize max, TVLSize& bitmap, TVLSize& capture) {
+    const AppShareConfig& config = *AppShareConfig::Instance();
+    bitmap = source;
+    if (!config.m_bCaptureResampleEnable) {
+        capture = bitmap;
+        return;
+    }
+    if (!config.m_bCaptureResampleFixSizeEnable) {
+        bitmap = TvlGraphicUtil::TvlGetMaxCapSize(source, max);
+        capture = bitmap;
+        return;
+    }
+    bitmap = {config.GetResampleScreenCaptureWidth(), config.GetResampleScreenCaptureHeight()};
+    const float across = static_cast<float>(source.cx) / static_cast<float>(bitmap.cx);
+    const float down = static_cast<float>(source.cy) / static_cast<float>(bitmap.cy);
+    if (across > down)
+        capture = {bitmap.cx, CmTruncate(static_cast<double>(bitmap.cx) * source.cy / source.cx)};
+    else
+        capture = {CmTruncate(static_cast<double>(source.cx) * bitmap.cy / source.cy), bitmap.cy};
+}
+
+bool CShareCGSCapturer::IsWindowArea() const {
+    return !isDesktopSharing() && !m_shareCapturerContext->m_bNoWindowBaseArea;
+}
+
+/// The frame becomes as large as what the windows cover.
+void CShareCGSCapturer::FitToWindows(Pass& pass) {
+    const TVLSize source = PixelsOf(pass.imageRect.size, m_fDisplayScale);
+    calcCaptureSize(source, m_szMaxCapture, pass.bitmap, pass.capture);
+    pass.drawRect = pass.imageRect;
+    if (pass.imageRect.size.width > 0)
+        AppShareConfig::Instance()->SetCurrentScale(static_cast<float>(pass.bitmap.cx) /
+                                                    pass.imageRect.size.width);
+}
+
+// ---- A pass
+
+int CShareCGSCapturer::capture(IShareFrame* frame, unsigned display, TVLSize bitmap, TVLSize capture) {
+    if (frame == nullptr)
+        return SHARE_CAPTURE_FAILED;
+    m_bPointerCaptured = false;
+    if (display != m_nCapturedDisplayId) {
+        m_nCapturedDisplayId = display;
+        m_fDisplayScale = CMonitorEnumMac::screenScaleFactorForDisplayID(display);
+    }
+    m_rectCapturedDisplay = platform::CGDisplayBounds(display);
+
+    Pass pass{bitmap, capture, nullptr, {}, m_rectCapturedDisplay, isDesktopSharing()};
+    const int result = createShareImage(m_rectCapturedDisplay, pass.image, pass.imageRect);
+    if (result == SHARE_CAPTURE_NO_DATA)
+        pass.imageRect = m_rectLastCapture.size.width != 0 ? m_rectLastCapture : m_rectCapturedDisplay;
+    else if (result != SHARE_CAPTURE_OK)
+        return result;
+    if (IsWindowArea())
+        FitToWindows(pass);
+
+    frame->Reset();
+    frame->SetFrameDataFormat(SHARE_FRAME_FORMAT_RGBA);
+    frame->SetFrameSize(pass.bitmap);
+    m_rectLastCapture = pass.drawRect;
+    initCapturerByData(frame->GetFrameData(),
+                       static_cast<unsigned long>(std::max(frame->GetFrameDataLen(), 0)), pass.bitmap);
+    PaintBackground(pass);
+    if (pass.image != nullptr) {
+        DrawPicture(pass);
+        DrawPointer(pass.drawRect);
+    }
+    frame->SetMetaInfo({ShareUtilMac::CGRectToTVLRect(pass.drawRect), m_bPointerCaptured});
+    return SHARE_CAPTURE_OK;
+}
+
+void CShareCGSCapturer::initCapturerByData(unsigned char* data, unsigned long length, TVLSize size) {
+    const unsigned long rowBytes = static_cast<unsigned long>(std::max(size.cx, 0)) * BYTES_PER_PIXEL;
+    const bool isLongEnough = length >= rowBytes * static_cast<unsigned long>(std::max(size.cy, 0));
+    if (m_bmpContext != nullptr && data == m_pFrameData && size == m_sizeBmpContext && isLongEnough)
+        return;
+    m_sizeBmpContext = size;
+    m_pFrameData = data;
+    m_bmpContext = platform::CGBitmapContextCreate(data, length, size.cx, size.cy, 8,
+                                                   CmTruncate(static_cast<double>(rowBytes)), m_nBitmapInfo);
+    platform::CGContextSetInterpolationQuality(m_bmpContext.get(), platform::kCGInterpolationHigh);
+    // Nothing will be painted then, and what the memory held was some earlier picture.
+    if (m_bmpContext == nullptr && data != nullptr)
+        std::memset(data, 0, length);
+}
+
+/// Frames are used again and again: what the picture doesn't cover would still show an earlier one, of
+/// windows that may be kept out by now.
+void CShareCGSCapturer::PaintBackground(const Pass& pass) {
+    if (!pass.isDesktop)
+        FillWhole(m_bmpContext.get(), pass.bitmap, AppShareConfig::Instance()->m_nAppShareBackgroundColor);
+    else if (!pass.CoversFrame())
+        FillWhole(m_bmpContext.get(), pass.bitmap, BLACK);
+}
+
+/// Where the picture goes, counted from the bottom of the frame.
+platform::CGRect CShareCGSCapturer::PlaceOf(const Pass& pass) const {
+    const platform::CGRect whole{{static_cast<float>(std::max(pass.bitmap.cx - pass.capture.cx, 0) / 2),
+                                  static_cast<float>(std::max(pass.bitmap.cy - pass.capture.cy, 0) / 2)},
+                                 {static_cast<float>(pass.capture.cx), static_cast<float>(pass.capture.cy)}};
+    if (pass.isDesktop || IsWindowArea())
+        return whole;
+    const platform::CGRect& bounds = m_rectCapturedDisplay;
+    const platform::CGRect& image = pass.imageRect;
+    const float fromBottom = bounds.origin.y + bounds.size.height - image.origin.y - image.size.height;
+    return {{(image.origin.x - bounds.origin.x) * whole.size.width / bounds.size.width + whole.origin.x,
+             fromBottom * whole.size.height / bounds.size.height + whole.origin.y},
+            {whole.size.width * image.size.width / bounds.size.width,
+             whole.size.height * image.size.height / bounds.size.height}};
+}
+
+void CShareCGSCapturer::DrawPicture(const Pass& pass) {
+    const platform::CGRect place = PlaceOf(pass);
+    ShareDumpTimeUsage usage;
+    const bool isWhole = platform::CGContextDrawWindowImage(m_bmpContext.get(), place, pass.image.get());
+    // Where a layer is missing, the frame may still show an earlier picture.
+    if (!isWhole && pass.CoversFrame())
+        FillWhole(m_bmpContext.get(), pass.bitmap, BLACK);
+    TraceDrawing(usage, pass.image.get(), place);
+}
+
+void CShareCGSCapturer::DrawPointer(const platform::CGRect& drawRect) {
+    const platform::CGPoint location = platform::CGEventGetLocation(platform::CGEventCreate(nullptr));
+    if (!platform::CGRectContainsPoint(drawRect, location)) {
+        m_bPointerCaptured = true;
+        return;
+    }
+    if (HasFlag(SHARE_CONFIG_FLAG_NO_POINTER))
+        return;
+    const float scale = AppShareConfig::Instance()->GetCurrentScale();
+    const platform::CGPoint place{(location.x - drawRect.origin.x) * scale,
+                                  (location.y - drawRect.origin.y) * scale};
+    m_bPointerCaptured = ShareUtilMac::CaptureCursorToCGContext(m_bmpContext.get(), place, scale);
+}
+
+// ---- Windows
+
+bool CShareCGSCapturer::isDesktopSharing() const {
+    return m_shareCapturerContext == nullptr || m_shareCapturerContext->GetShareType() == SHARE_TYPE_DESKTOP;
+}
+
+bool CShareCGSCapturer::isWindowShared(unsigned window) const {
+    return m_shareCapturerContext == nullptr || m_shareCapturerContext->IsWindowShared(window);
+}
+
+/// Looks a shared window's owner up once more. A verdict that was made while the window server failed took
+/// the window for nobody's, whom nobody keeps out: what can't be told now, or belongs to an application that
+/// is kept out, stays away unless the window itself is shared.
+bool CShareCGSCapturer::MayBeKeptOut(unsigned window) const {
+    platform::CGSConnectionID owner = 0;
+    pid_t pid = 0;
+    const platform::CGSConnectionID connection = platform::CGSDefaultConnection();
+    const platform::CGError error = platform::CGSGetWindowOwner(connection, window, &owner);
+    if (error == platform::kCGErrorFailure)
+        return false; // really nobody's
+    if (error == platform::kCGErrorSuccess &&
+        platform::CGSConnectionGetPID(owner, &pid) == platform::kCGErrorSuccess &&
+        !m_shareCapturerContext->IsAppUnShared(static_cast<unsigned>(pid)))
+        return false;
+    std::vector<unsigned> shared;
+    m_shareCapturerContext->GetSharedWindows(shared);
+    return std::find(shared.begin(), shared.end(), window) == shared.end();
+}
+
+/// Whether there may be something that a picture of a whole display must not show.
+bool CShareCGSCapturer::KeepsOut() const {
+    if (m_shareCapturerContext == nullptr)
+        return false;
+    return !isDesktopSharing() || m_shareCapturerContext->GetUnSharedWindowCount() > 0 ||
+           m_shareCapturerContext->GetUnSharedAppCount() > 0;
+}
+
+int CShareCGSCapturer::createShareImage(const platform::CGRect& rect, platform::CGWindowImageRef& image,
+                                        platform::CGRect& outRect) {
+    image = nullptr;
+    std::vector<unsigned> windows;
+    if (isDesktopSharing()) {
+        std::vector<int> onScreen;
+        getCaptureWindows(onScreen);
+        windows.assign(onScreen.begin(), onScreen.end());
+    } else {
+        TVLRect box{};
+        m_shareCapturerContext->GetCapturedWindows(windows);
+        m_shareCapturerContext->GetSharedWindowBoxRect(box);
+        outRect = ShareUtilMac::TVLRectToCGRect(box);
+    }
+    if (windows.empty())
+        return SHARE_CAPTURE_NO_DATA;
+    image = createScreenShot(windows.data(), windows.size(), rect, outRect);
+    return image != nullptr ? SHARE_CAPTURE_OK : SHARE_CAPTURE_FAILED;
+}
+
+bool CShareCGSCapturer::getCaptureWindows(std::vector<int>& windows) {
+    ShareUtilMac::GetOnScreenWindowList(windows);
+    const auto isKeptOut = [this](int id) {
+        const auto window = static_cast<unsigned>(id);
+        return !isWindowShared(window) || (m_shareCapturerContext != nullptr && MayBeKeptOut(window));
+    };
+    windows.erase(std::remove_if(windows.begin(), windows.end(), isKeptOut), windows.end());
+    return true;
+}
+
+platform::CGWindowImageRef CShareCGSCapturer::createScreenShot(const unsigned* windows, unsigned long count,
+                                                               const platform::CGRect& rect,
+                                                               platform::CGRect& outRect) {
+    if (windows == nullptr || count == 0)
+        return nullptr;
+    const std::span<const platform::CGWindowID> list(windows, count);
+    const bool isDesktop = isDesktopSharing();
+    if (isDesktop)
+        outRect = rect;
+    else if (!HasArea(outRect))
+        outRect = getAppRect(list, rect);
+    const unsigned options =
+        isDesktop ? platform::kCGWindowImageBoundsIgnoreFraming : platform::kCGWindowImageDefault;
+    return platform::CGWindowListTakeImage(outRect, list, options, KeepsOut());
+}
+
+platform::CGRect CShareCGSCapturer::getAppRect(std::span<const platform::CGWindowID> windows,
+                                               const platform::CGRect& rect) {
+    const TVLRect clip = ShareUtilMac::CGRectToTVLRect(rect);
+    TVLRect box{};
+    bool isFirst = true;
+    for (const platform::CGWindowDescription& window :
+         platform::CGWindowListCreateDescriptionFromArray(windows)) {
+        const TVLRect part =
+            ShareUtil::Intersect(ShareUtilMac::CGRectToTVLRect(window.kCGWindowBounds), clip);
+        if (part == TVLRect{})
+            continue;
+        box = isFirst ? part
+                      : TVLRect{std::min(box.left, part.left), std::min(box.top, part.top),
+                                std::max(box.right, part.right), std::max(box.bottom, part.bottom)};
+        isFirst = false;
+    }
+    platform::CGRect result = ShareUtilMac::TVLRectToCGRect(box);
+    // Each component for itself: an origin that moves doesn't take the far corner along.
+    result.origin = {std::max(result.origin.x, rect.origin.x), std::max(result.origin.y, rect.origin.y)};
+    result.size = {std::min(result.size.width, rect.size.width),
+                   std::min(result.size.height, rect.size.height)};
+    return result;
+}
+
+platform::CGImageRef CShareCGSCapturer::captureRect(const unsigned* windows, unsigned long count,
+                                                    const platform::CGRect& rect, bool ignoreFraming) {
+    if (windows == nullptr || count == 0)
+        return nullptr;
+    return platform::CGWindowListCreateImageFromArray(rect, {windows, count}, ignoreFraming ? 1 : 0);
+}

@@ -1,0 +1,97 @@
+// SPDX-License-Identifier: Apache-2.0
+#pragma once
+
+#include "platform/bitmap_context.h"
+#include "platform/cg_image.h"
+#include "platform/core_graphics_images.h"
+#include "platform/core_types.h"
+
+#include <screenshare/share_types.h>
+
+#include <memory>
+#include <span>
+#include <vector>
+
+class IShareFrame;
+class ShareCapturerContext;
+
+/// Makes one finished picture from the window server on demand: of the windows that are shared and of no
+/// other, scaled, centred, on its background, with the pointer on top.
+///
+/// Frame:    RGBA without alpha, drawn straight into its memory. Whatever a pass doesn't draw on is painted
+///           over first, so that a frame that is used again shows nothing of before.
+/// Lifetime: keeps a bitmap context on the memory of the frame that it drew into last, and touches that only
+///           in a pass that is given the same memory.
+/// Threads:  one at a time.
+/// Units:    the desktop in global points, bitmaps in pixels.
+/// Errors:   SHARE_CAPTURE_RESULT codes. May throw std::bad_alloc.
+class CShareCGSCapturer {
+public:
+    /// Without a context the share counts as one of the desktop, with every window shared.
+    explicit CShareCGSCapturer(const std::shared_ptr<ShareCapturerContext>& context);
+    virtual ~CShareCGSCapturer();
+    CShareCGSCapturer(const CShareCGSCapturer&) = delete;
+    CShareCGSCapturer& operator=(const CShareCGSCapturer&) = delete;
+
+    // The size of a frame and that of the picture in it. They differ only where a fixed size is set, in which
+    // the picture keeps its ratio.
+    static void calcScreenSize(unsigned display, TVLSize max, platform::CGRect& rect, TVLSize& bitmap,
+                               TVLSize& capture);
+    static void calcCaptureSize(TVLSize source, TVLSize max, TVLSize& bitmap, TVLSize& capture);
+
+    /// 0 with the frame filled; anything else leaves it as it was. A share without windows is no failure: it
+    /// gives its background.
+    int capture(IShareFrame* frame, unsigned display, TVLSize bitmap, TVLSize capture);
+
+    /// Has the bitmap context lie on that memory, `length` bytes; there is none if that is too short.
+    void initCapturerByData(unsigned char* data, unsigned long length, TVLSize size);
+
+    /// What is shared of `rect`. -302 when no window is, -1 when there is no picture. `outRect` becomes what
+    /// the image shows.
+    int createShareImage(const platform::CGRect& rect, platform::CGWindowImageRef& image,
+                         platform::CGRect& outRect);
+    bool isDesktopSharing() const;
+    /// Replaces `windows` by those on screen that are shared, front first. Always true.
+    bool getCaptureWindows(std::vector<int>& windows);
+    /// Null for no windows. `outRect` is what is wanted of an application or a window, and becomes what the
+    /// image shows.
+    platform::CGWindowImageRef createScreenShot(const unsigned* windows, unsigned long count,
+                                                const platform::CGRect& rect, platform::CGRect& outRect);
+    /// The box of what the windows have within `rect`.
+    static platform::CGRect getAppRect(std::span<const platform::CGWindowID> windows,
+                                       const platform::CGRect& rect);
+    /// Null for no windows.
+    static platform::CGImageRef captureRect(const unsigned* windows, unsigned long count,
+                                            const platform::CGRect& rect, bool ignoreFraming);
+    bool isWindowShared(unsigned window) const;
+    /// Only for pictures that are cut to the shared windows.
+    void setMaxSize(TVLSize size) { m_szMaxCapture = size; }
+
+    /// Of the last pass: the pointer is in the picture, or need not be.
+    bool PointerCaptured() const { return m_bPointerCaptured; }
+
+private:
+    /// What a pass has found out so far.
+    struct Pass;
+
+    bool IsWindowArea() const;
+    bool MayBeKeptOut(unsigned window) const;
+    bool KeepsOut() const;
+    void FitToWindows(Pass& pass);
+    platform::CGRect PlaceOf(const Pass& pass) const;
+    void PaintBackground(const Pass& pass);
+    void DrawPicture(const Pass& pass);
+    void DrawPointer(const platform::CGRect& drawRect);
+
+    std::shared_ptr<ShareCapturerContext> m_shareCapturerContext;
+    TVLSize m_sizeBmpContext{};
+    TVLSize m_szMaxCapture{};
+    unsigned m_nCapturedDisplayId;
+    float m_fDisplayScale; // pixels per point
+    platform::CGRect m_rectCapturedDisplay;
+    const unsigned m_nBitmapInfo = platform::kCGImageAlphaNoneSkipLast;
+    platform::CGContextRef m_bmpContext; // on m_pFrameData
+    unsigned char* m_pFrameData = nullptr;
+    platform::CGRect m_rectLastCapture;
+    bool m_bPointerCaptured = false;
+};
