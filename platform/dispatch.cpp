@@ -111,8 +111,9 @@ void DispatchQueue::RunBlocks() {
 
 dispatch_queue_t dispatch_queue_create(const char* label, dispatch_queue_attr_t attribute) noexcept {
     dispatch_queue_t queue;
-    CmCallGuarded("[dispatch_queue_create]>>exception: ",
-                  [&] { queue = dispatch_queue_t(new DispatchQueue(label, attribute), EndQueue); });
+    CmCallGuarded("[dispatch_queue_create]>>exception: ", [&] {
+        queue = dispatch_queue_t(new DispatchQueue(label, attribute), EndQueue); // NOLINT: guarded
+    });
     return queue;
 }
 

@@ -40,7 +40,7 @@ std::string HomeOfAccount() {
 
 /// Empty when there is none.
 std::string HomeFolder() {
-    const std::string home = Variable("HOME");
+    std::string home = Variable("HOME");
     if (IsAbsolute(home))
         return home;
     const std::string ofAccount = HomeOfAccount();

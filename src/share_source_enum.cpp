@@ -166,5 +166,5 @@ void CShareSourceEnumerator::SetFilter(IShareSourceFilter* filter) {
 void CShareSourceEnumerator::Cleanup() {
     CmTraceDebug("[CShareSourceEnumerator::Cleanup]");
     CleanShareSource();
-    CleanSink();
+    CleanSink(); // NOLINT(clang-analyzer-optin.cplusplus.VirtualCall): in the destructor the base's own is meant
 }

@@ -15,6 +15,7 @@ std::vector<ListedMonitor> ListMonitors() {
         displays.resize(count);
 
     std::vector<ListedMonitor> monitors;
+    monitors.reserve(displays.size());
     for (const platform::CGDirectDisplayID display : displays)
         monitors.push_back({display, platform::DisplayProductName(display),
                             platform::CGDisplayBounds(display),

@@ -34,9 +34,9 @@ public:
         std::printf("%d windows\n", count);
     }
 
-    void Wait() {
+    bool Wait() {
         std::unique_lock<std::mutex> lock(m_mutex);
-        m_arrived.wait_for(lock, std::chrono::seconds(10), [this] { return m_left <= 0; });
+        return m_arrived.wait_for(lock, std::chrono::seconds(10), [this] { return m_left <= 0; });
     }
 
 private:
@@ -50,9 +50,9 @@ int Share(IShareCaptureEngine* engine, IShareSource* monitor) {
     engine->AddCaptureShareSource(monitor);
     engine->SetSink(&sink);
     engine->SetCaptureFps(10);
-    const int result = engine->Start();
-    if (result == SHARE_RESULT_OK)
-        sink.Wait();
+    int result = engine->Start();
+    if (result == SHARE_RESULT_OK && !sink.Wait())
+        result = SHARE_RESULT_FAILED;
     DestroyShareCaptureEngine(engine); // stops it first: no call of the sink comes after this
     return result;
 }

@@ -39,7 +39,7 @@ constexpr CGWindowID WindowOfDisplay(CGDirectDisplayID display) {
 ///
 /// Threads: any; one lock. A thread of its own runs only while something is to be told at a later time.
 /// Forking: in a child nothing is touched, whoever held the lock; see Share.
-class Desk {
+class Desk { // NOLINT(clang-analyzer-optin.performance.Padding): one a server, its members by subject
 public:
     using Nanoseconds = std::chrono::nanoseconds;
     using Lock = CCmWaitPoint::Lock;

@@ -81,12 +81,13 @@ Desk::Entry Desk::EnterWaiting(SimulatedOperation operation, Nanoseconds deadlin
     Entry entry{m_point.Acquire(), PictureOutcome::Ok};
     CatchUp();
     const LifeState before = m_life;
-    if (before.life != Life::Alive)
+    const bool wasAlive = before.life == Life::Alive;
+    const bool answered =
+        wasAlive && asked < deadline && WaitForAnswer(entry.lock, After(asked, fate.delay), deadline);
+    if (!wasAlive || (answered && m_life != before))
         entry.outcome = PictureOutcome::Lost;
-    else if (asked >= deadline || !WaitForAnswer(entry.lock, After(asked, fate.delay), deadline))
+    else if (!answered)
         entry.outcome = PictureOutcome::Timeout;
-    else if (m_life != before)
-        entry.outcome = PictureOutcome::Lost;
     else if (fate.fails)
         entry.outcome = fate.outcome;
     return entry;

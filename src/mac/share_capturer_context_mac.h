@@ -30,7 +30,7 @@ private:
     struct WalkedWindow;
 
     Walk _BeginWalk() const;
-    void _WalkWindow(Walk& walk, unsigned window);
+    void _WalkWindow(Walk& walk, unsigned id);
     void _KeepWindow(Walk& walk, WalkedWindow& window);
     void _KeepOutWindow(Walk& walk, const WalkedWindow& window);
     /// Makes overlap of a part of the visible region.

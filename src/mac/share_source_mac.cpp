@@ -60,9 +60,11 @@ const char* CShareSourceMac::KeptName() {
         return nullptr;
     // Others may have looked it up meanwhile, and may be reading it: the first name stays.
     char* first = nullptr;
-    if (!kept.compare_exchange_strong(first, found.get(), std::memory_order_acq_rel))
+    char* const mine = found.get();
+    if (!kept.compare_exchange_strong(first, mine, std::memory_order_acq_rel))
         return first;
-    return found.release();
+    static_cast<void>(found.release()); // the record's from now on
+    return mine;
 }
 
 CShareSourceMac::Text CShareSourceMac::LookUpName() const {
