@@ -16,7 +16,6 @@
 #include <screenshare/share_frame.h>
 #include <screenshare/share_graphic_util.h>
 
-#include <sys/types.h>
 #include <algorithm>
 #include <cstring>
 
