@@ -3,9 +3,9 @@
 
 #include "platform/simulated/scene.h"
 #include "platform/window_server.h"
-#include "src/app_share_config.h"
 #include "src/share_frame.h"
 #include "src/share_ref.h"
+#include "tests/support/settings_scope.h"
 
 #include <gtest/gtest.h>
 
@@ -32,30 +32,6 @@ public:
 private:
     const std::shared_ptr<platform::SimulatedWindowServer> m_server;
     const std::shared_ptr<platform::WindowServer> m_former;
-};
-
-/// Puts the settings of the process that captures read back to their defaults, before and after a test.
-class CCaptureSettingsScope {
-public:
-    CCaptureSettingsScope() { Reset(); }
-    ~CCaptureSettingsScope() { Reset(); }
-    CCaptureSettingsScope(const CCaptureSettingsScope&) = delete;
-    CCaptureSettingsScope& operator=(const CCaptureSettingsScope&) = delete;
-
-    AppShareConfig* operator->() const { return AppShareConfig::Instance(); }
-
-private:
-    static void Reset() {
-        AppShareConfig& config = *AppShareConfig::Instance();
-        config.m_nShareConfigFlags = 0;
-        config.m_bCaptureResampleEnable = true;
-        config.m_bCaptureResampleFixSizeEnable = false;
-        config.m_nResampleScreenCaptureWidth = 1920;
-        config.m_nResampleScreenCaptureHeight = 1080;
-        config.m_nAppShareBackgroundColor = 0x9e9e;
-        config.m_nScreenCapturerType = 1;
-        config.m_fCurrentScale = 1.0F;
-    }
 };
 
 /// A colour as 0xRRGGBB, or why there is none.

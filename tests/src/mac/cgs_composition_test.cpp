@@ -68,7 +68,7 @@ protected:
     FramePixel At(int x, int y) { return PixelAt(*frame.Get(), x, y); }
     IShareFrame::MetaInfo Meta() { return frame.Get()->GetMetaInfo(); }
 
-    CCaptureSettingsScope settings;
+    CSettingsScope settings;
     CServedScene desktop{Desk()};
     std::shared_ptr<ShareCapturerContext> context = std::make_shared<ShareCapturerContextMac>();
     CShareCGSCapturer capturer{context};

@@ -117,7 +117,7 @@ void LookAt(IShareFrame& frame, Seen& seen) {
 Seen CaptureThroughUnrest(SimulatedLie* lie, int captures) {
     constexpr unsigned SEED = 4711;
     CManualClockScope clock;
-    const CCaptureSettingsScope settings;
+    const CSettingsScope settings;
     const CServedScene desktop(BusyDesk());
     if (lie != nullptr)
         desktop->Lie(*lie);

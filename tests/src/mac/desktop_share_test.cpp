@@ -123,7 +123,7 @@ protected:
     }
 
     CManualClockScope clock;
-    CCaptureSettingsScope settings;
+    CSettingsScope settings;
     CServedScene desktop{SecretDesk()};
     CCallLog calls;
     CRecordingSink sink{calls};

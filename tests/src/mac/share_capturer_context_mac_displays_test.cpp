@@ -47,7 +47,7 @@ protected:
     float Scale() { return settings->GetCurrentScale(); }
     Rects Region() { return RegionGot(context, &ShareCapturerContext::GetDisplayRegion); }
 
-    CWalkSettingsScope settings;
+    CSettingsScope settings;
     CDesktopScope desktop;
     CMacContextProbe context;
 };

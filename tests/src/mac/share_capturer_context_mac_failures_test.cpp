@@ -77,7 +77,7 @@ protected:
     Rects Visible() { return RegionGot(context, &ShareCapturerContext::GetVisiableRegion); }
     Rects Overlap() { return RegionGot(context, &ShareCapturerContext::GetOverlapRegion); }
 
-    const CWalkSettingsScope settings;
+    const CSettingsScope settings;
     const CJumpingClockScope nothingStaysPinned;
     const std::shared_ptr<CFailingWindowServer> server = std::make_shared<CFailingWindowServer>();
     CMacContextProbe context;

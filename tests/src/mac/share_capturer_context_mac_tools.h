@@ -2,9 +2,9 @@
 #pragma once
 
 #include "platform/core_graphics.h"
-#include "src/app_share_config.h"
 #include "src/mac/share_capturer_context_mac.h"
 #include "tests/src/share_capturer_context_tools.h"
+#include "tests/support/settings_scope.h"
 #include "util/cm_clock.h"
 
 #include <atomic>
@@ -34,29 +34,6 @@ inline int MenuLevel() {
 inline int DesktopLevel() {
     return platform::CGWindowLevelForKey(platform::kCGDesktopWindowLevelKey);
 }
-
-/// Puts the settings of the process that the walk reads back to their defaults, before and after a test.
-class CWalkSettingsScope {
-public:
-    CWalkSettingsScope() { Reset(); }
-    ~CWalkSettingsScope() { Reset(); }
-    CWalkSettingsScope(const CWalkSettingsScope&) = delete;
-    CWalkSettingsScope& operator=(const CWalkSettingsScope&) = delete;
-
-    AppShareConfig* operator->() const { return AppShareConfig::Instance(); }
-
-private:
-    static void Reset() {
-        AppShareConfig& config = *AppShareConfig::Instance();
-        config.m_nShareConfigFlags = 0;
-        config.m_bCaptureResampleEnable = true;
-        config.m_bCaptureResampleFixSizeEnable = false;
-        config.m_nResampleScreenCaptureWidth = 1920;
-        config.m_nResampleScreenCaptureHeight = 1080;
-        config.m_bAppDisplayByWindow = true;
-        config.m_fCurrentScale = 1.0F;
-    }
-};
 
 /// A clock that jumps at every reading: what was pinned for a while is past at once.
 class CJumpingClockScope {
@@ -130,7 +107,7 @@ protected:
     Values Captured() { return context.m_vCapturedWindows; }
     Values Excluded() { return context.m_vCapturedExcludedWindows; }
 
-    CWalkSettingsScope settings;
+    CSettingsScope settings;
     CDesktopScope desktop;
     CMacContextProbe context;
 };

@@ -97,7 +97,7 @@ protected:
     void UseSink() { EXPECT_EQ(capturer.AddSink(&sink), 0); }
 
     CManualClockScope clock;
-    CCaptureSettingsScope settings;
+    CSettingsScope settings;
     CServedScene desktop{Desk()};
     std::shared_ptr<ShareCapturerContext> context = std::make_shared<ShareCapturerContextMac>();
     CShareCapturerDesktopMac capturer{context};

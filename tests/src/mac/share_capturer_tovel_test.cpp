@@ -55,7 +55,7 @@ protected:
     static unsigned Code(int result) { return static_cast<unsigned>(result); }
 
     CManualClockScope clock;
-    CCaptureSettingsScope settings;
+    CSettingsScope settings;
     CServedScene desktop{Desk()};
     std::shared_ptr<ShareCapturerContext> context = std::make_shared<ShareCapturerContextMac>();
     ShareCapturerTovel backEnd;

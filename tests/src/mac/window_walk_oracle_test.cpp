@@ -139,7 +139,7 @@ protected:
         scenesWithDocks += picture.dockPixels > 0 ? 1 : 0;
     }
 
-    const CWalkSettingsScope settings;
+    const CSettingsScope settings;
     const CFakeWindowServerScope server;
     int scenesWithOverlap = 0;
     int scenesWithVisible = 0;
