@@ -17,7 +17,7 @@
 namespace {
 
 constexpr int CURSOR_EDGE = 16; // pixels
-constexpr std::size_t CURSOR_PIXELS = CURSOR_EDGE * CURSOR_EDGE;
+constexpr std::size_t CURSOR_PIXELS = std::size_t{CURSOR_EDGE} * CURSOR_EDGE;
 constexpr std::size_t MAX_PIXEL_BYTES = 4;
 
 using CursorBytes = std::array<unsigned char, CURSOR_PIXELS * MAX_PIXEL_BYTES>;
@@ -62,7 +62,7 @@ CCursorImage::~CCursorImage() {
 CSharePointingMouse::CSharePointingMouse(unsigned baseDisplay) : m_nBaseDisplayID(baseDisplay) {}
 
 CSharePointingMouse::~CSharePointingMouse() {
-    CleanSink();
+    CSharePointingMouse::CleanSink();
 }
 
 int CSharePointingMouse::AddSink(ISharePointingSink* sink) {

@@ -42,6 +42,12 @@ void FillWhole(platform::CGContext* context, TVLSize size, int colour) {
                                 {{0, 0}, {static_cast<float>(size.cx), static_cast<float>(size.cy)}});
 }
 
+/// Where a length lies that is centred in another; whole pixels, the odd one behind it.
+float CentredIn(int whole, int part) {
+    const int margin = std::max(whole - part, 0) / 2;
+    return static_cast<float>(margin);
+}
+
 bool HasFlag(SHARE_CONFIG_FLAGS flag) {
     return (AppShareConfig::Instance()->m_nShareConfigFlags & flag) != 0;
 }
@@ -189,9 +195,9 @@ void CShareCGSCapturer::PaintBackground(const Pass& pass) {
 
 /// Where the picture goes, counted from the bottom of the frame.
 platform::CGRect CShareCGSCapturer::PlaceOf(const Pass& pass) const {
-    const platform::CGRect whole{{static_cast<float>(std::max(pass.bitmap.cx - pass.capture.cx, 0) / 2),
-                                  static_cast<float>(std::max(pass.bitmap.cy - pass.capture.cy, 0) / 2)},
-                                 {static_cast<float>(pass.capture.cx), static_cast<float>(pass.capture.cy)}};
+    const platform::CGRect whole{
+        {CentredIn(pass.bitmap.cx, pass.capture.cx), CentredIn(pass.bitmap.cy, pass.capture.cy)},
+        {static_cast<float>(pass.capture.cx), static_cast<float>(pass.capture.cy)}};
     if (pass.isDesktop || IsWindowArea())
         return whole;
     const platform::CGRect& bounds = m_rectCapturedDisplay;

@@ -55,16 +55,14 @@ const char* CShareSourceMac::KeptName() {
     const std::atomic_ref<char*> kept(m_info.pName);
     if (const char* const name = kept.load(std::memory_order_acquire))
         return name;
-    Text found = LookUpName();
+    Text found = LookUpName(); // NOLINT(clang-analyzer-cplusplus.NewDeleteLeaks): the record keeps it
     if (found == nullptr)
         return nullptr;
     // Others may have looked it up meanwhile, and may be reading it: the first name stays.
     char* first = nullptr;
-    char* const mine = found.get();
-    if (!kept.compare_exchange_strong(first, mine, std::memory_order_acq_rel))
+    if (!kept.compare_exchange_strong(first, found.get(), std::memory_order_acq_rel))
         return first;
-    static_cast<void>(found.release()); // the record's from now on
-    return mine;
+    return found.release();
 }
 
 CShareSourceMac::Text CShareSourceMac::LookUpName() const {
