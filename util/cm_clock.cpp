@@ -27,7 +27,7 @@ constinit std::mutex g_waitPointsMutex;
 constinit CCmWaitPoint* g_firstWaitPoint = nullptr;
 
 // A child process that our host forks must find the list free.
-[[maybe_unused]] const int g_forkHandlers = pthread_atfork(
+[[maybe_unused]] const int g_clockForkHandlers = pthread_atfork(
     [] { g_waitPointsMutex.lock(); }, [] { g_waitPointsMutex.unlock(); }, [] { g_waitPointsMutex.unlock(); });
 
 long long Microseconds(nanoseconds time) {

@@ -38,7 +38,7 @@ void NameThisThread(const std::string& name) {
 constinit std::mutex g_endedMutex;
 
 // A child process that our host forks must find the mutex free.
-[[maybe_unused]] const int g_forkHandlers =
+[[maybe_unused]] const int g_threadForkHandlers =
     pthread_atfork([] { g_endedMutex.lock(); }, [] { g_endedMutex.unlock(); }, [] { g_endedMutex.unlock(); });
 
 /// The threads whose objects were destroyed on them, which therefore could not be joined there. Nothing but

@@ -71,7 +71,7 @@ void AfterForkInChild() {
 struct ForkHandlers {
     ForkHandlers() { pthread_atfork(BeforeFork, AfterForkInParent, AfterForkInChild); }
 };
-const ForkHandlers g_forkHandlers;
+const ForkHandlers g_traceForkHandlers;
 
 // ---- thresholds
 

@@ -29,6 +29,13 @@ private:
     int m_fd;
 };
 
+/// With a slash behind it a link would be followed, whatever is asked for.
+std::string WithoutSlashAtEnd(std::string folder) {
+    while (folder.size() > 1 && folder.back() == '/')
+        folder.pop_back();
+    return folder;
+}
+
 /// Whether only this user and root can have written it.
 bool IsTrusted(const struct stat& status) {
     const bool isOurs = status.st_uid == geteuid() || status.st_uid == 0;
@@ -57,7 +64,8 @@ bool ReadFully(int fd, std::string& text) {
 } // namespace
 
 std::optional<std::string> CmReadTrustedFile(const std::string& folder, const char* name) {
-    const Descriptor dir(open(folder.c_str(), O_RDONLY | O_DIRECTORY | O_NOFOLLOW | O_CLOEXEC));
+    const Descriptor dir(
+        open(WithoutSlashAtEnd(folder).c_str(), O_RDONLY | O_DIRECTORY | O_NOFOLLOW | O_CLOEXEC));
     struct stat dirStatus {};
     if (!dir.IsOpen() || fstat(dir.Get(), &dirStatus) != 0 || !IsTrusted(dirStatus))
         return std::nullopt;
@@ -74,4 +82,10 @@ std::optional<std::string> CmReadTrustedFile(const std::string& folder, const ch
     if (!ReadFully(file.Get(), text) || fstat(file.Get(), &after) != 0 || !IsSameState(before, after))
         return std::nullopt;
     return text;
+}
+
+bool CmIsTrustedFolder(const std::string& folder) {
+    struct stat status {};
+    return lstat(WithoutSlashAtEnd(folder).c_str(), &status) == 0 && S_ISDIR(status.st_mode) &&
+           IsTrusted(status);
 }

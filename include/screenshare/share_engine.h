@@ -5,6 +5,7 @@
 #include <screenshare/share_capturer.h>
 #include <screenshare/share_capturer_base.h>
 #include <screenshare/share_capturer_types.h>
+#include <screenshare/share_convert.h>
 #include <screenshare/share_frame.h>
 #include <screenshare/share_graphic_util.h>
 #include <screenshare/share_pointing.h>
@@ -13,6 +14,7 @@
 #include <screenshare/share_thumbnail.h>
 #include <screenshare/share_trace.h>
 #include <screenshare/share_types.h>
+#include <screenshare/share_window_info.h>
 
 #include <memory>
 
@@ -75,6 +77,7 @@ SCREENSHARE_API int EnumWindowThumbnail(const unsigned* windows, int count, Thum
 SCREENSHARE_API void CancelThumbnail(ThumbnailCallback* callback);
 
 /// Calls back for each window, front first, on the calling thread. -2 for a null callback, else 0.
+/// ShareGetWindowInfo (share_window_info.h) tells more of each.
 SCREENSHARE_API int TvlEnumWindows(ITvlEnumWindowsCallback* callback, unsigned mode);
 
 } // extern "C"

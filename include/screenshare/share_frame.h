@@ -64,10 +64,11 @@ public:
     virtual int WriteFrameData(const unsigned char* data, int len) = 0;
     /// Writes one line. `data` is dense.
     virtual int WriteFrameLineData(int line, const unsigned char* data, int len) = 0;
-    /// Writes a rectangle that lies inside the frame; `data` holds its rows one after the other. Bytes per
-    /// pixel are taken as line length divided by width. 0 when refused, and also when it had to stop on the
-    /// way: the rows moved until then stay. An area with a left edge above 0 that reaches the last line gives
-    /// 0 on a frame without spare memory although all its rows were moved.
+    /// Writes a rectangle that lies inside the frame; `data` holds its rows one after the other, all of them
+    /// whatever `len` says: up to a row behind `len` is moved before it is noticed. Bytes per pixel are taken
+    /// as line length divided by width. 0 when refused, and also when it had to stop on the way: the rows
+    /// moved until then stay. An area with a left edge above 0 that reaches the last line gives 0 on a frame
+    /// without spare memory although all its rows were moved.
     virtual int WriteFrameAreaData(TVLRect& rect, const unsigned char* data, int len) = 0;
     /// Copies from the start of the pixels at most what the frame's memory holds, and gives `len`, also when
     /// it copied less; 0 when refused.

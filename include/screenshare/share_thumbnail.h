@@ -3,7 +3,8 @@
 
 #include <screenshare/share_types.h>
 
-/// Pixels of a thumbnail, in points of the window that it shows.
+/// Pixels of a thumbnail, in points of the window that it shows. All four bytes are 0 where there is nothing
+/// to show: outside of its shape, and in a window that hasn't painted yet or that its owner lets nobody see.
 /// Lifetime: `data` belongs to the library and holds for the one call that hands it over; copy what you keep.
 struct ImageData {
     SHARE_FRAME_FORMAT format; ///< SHARE_FRAME_FORMAT_RGBA, or 0 for an empty one.
@@ -15,8 +16,14 @@ struct ImageData {
 
 /// Takes thumbnails in.
 ///
-/// Threads:  called on the library's thumbnail thread, one call at a time.
-/// Lifetime: neither owned nor counted; CancelThumbnail it before it is destroyed.
+/// Threads:  called on the library's thumbnail thread, one call at a time. Inside a call everything may be
+///           asked for and cancelled, for this callback and for others. CancelThumbnail, a new request and
+///           ShareEngineUninit from another thread wait for a call under way: keep it short, and hold no lock
+///           around them that a call wants.
+/// Lifetime: neither owned nor counted; CancelThumbnail it before it is destroyed. Once that has returned
+///           there is no further call, so a callback may also cancel and destroy itself inside one.
+/// Order:    one request for each callback; a new one replaces it. Callbacks are served in the order of their
+///           addresses. A cancelled request tells nothing any more, no last item either.
 class ThumbnailCallback {
 public:
     /// `failed`: there is no picture, the image is all zeros. `last`: the last item of the request. False
