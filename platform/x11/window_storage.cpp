@@ -1,0 +1,334 @@
+// SPDX-License-Identifier: Apache-2.0
+#include "platform/x11/window_storage.h"
+
+#include "platform/x11/paint_nudge.h"
+#include "util/cm_clock.h"
+
+#include <xcb/composite.h>
+
+#include <algorithm>
+#include <cstring>
+#include <utility>
+
+namespace platform::x11 {
+
+namespace {
+
+/// A window that paints in thousands of little strokes would fill the socket.
+constexpr unsigned MOST_REPORTS = 256;
+/// Set when another rectangle of the same report follows.
+constexpr std::uint8_t MORE_FOLLOW = 0x80;
+
+/// Of two copies of the same size.
+bool HoldTheSame(const Picture& one, const Picture& other) {
+    const std::size_t bytes = one.stride * static_cast<std::size_t>(one.height);
+    return one.format == other.format && std::memcmp(one.pixels, other.pixels, bytes) == 0;
+}
+
+} // namespace
+
+PicturePtr PictureOf(const ServerPixels& pixels, const std::shared_ptr<SharedPixels>& block, int width,
+                     const PixelRect& visible, const PixelRegion& shown, const CGRect& rect) {
+    const bool isWhole = shown == PixelRegion(visible);
+    const std::size_t sourceStride = pixels.BytesPerRow(width);
+    auto picture = std::make_shared<Picture>();
+    picture->width = visible.right - visible.left;
+    picture->height = visible.bottom - visible.top;
+    picture->format = isWhole ? pixels.format : WithAlpha(pixels.format);
+    picture->rect = rect;
+    picture->time = CmSteadyNow();
+    if (isWhole && pixels.packing == ServerPixels::Packing::Whole) {
+        picture->stride = sourceStride;
+        picture->pixels = block->Bytes() + static_cast<std::size_t>(visible.top) * sourceStride +
+                          static_cast<std::size_t>(visible.left) * 4;
+        picture->memory = block;
+        return picture;
+    }
+    picture->stride = static_cast<std::size_t>(picture->width) * 4;
+    const std::size_t bytes = picture->stride * static_cast<std::size_t>(picture->height);
+    const auto copy = std::make_shared<std::uint8_t[]>(bytes); // transparent
+    DrawServerPixels(pixels, block->Bytes(), sourceStride, shown, picture->format, copy.get(),
+                     picture->stride, visible);
+    picture->pixels = copy.get();
+    picture->memory = copy;
+    return picture;
+}
+
+// ---- DamageWatch
+
+void DamageWatch::Begin(X11Connection& connection, xcb_window_t window, std::uint8_t level) {
+    End();
+    m_damage = connection.NewId();
+    m_connection = &connection;
+    CountFrom(xcb_damage_create(connection.Get(), m_damage, window, level).sequence + 1);
+    // A new watch begins by telling what is there. What comes later has to have another number.
+    xcb_no_operation(connection.Get());
+}
+
+void DamageWatch::End() {
+    if (m_damage == 0)
+        return;
+    xcb_damage_destroy(m_connection->Get(), m_damage);
+    m_damage = 0;
+}
+
+// ---- What is told of it
+
+WindowStorage::WindowStorage(X11Connection& connection, xcb_window_t window)
+    : m_connection(connection),
+      m_window(window) {}
+
+WindowStorage::~WindowStorage() {
+    ForgetPixmap();
+}
+
+void WindowStorage::SetSize(int width, int height, int border) {
+    m_width = width;
+    m_height = height;
+    m_border = border;
+}
+
+void WindowStorage::OnAdded(const TopLevel& told, Nanoseconds now) {
+    SetSize(told.StorageWidth(), told.StorageHeight(), told.border);
+    m_mapped = told.mapped;
+    m_proof.Renew({m_width, m_height, m_border}, false, now);
+    WatchPaintings(now);
+    m_connection.Flush(); // each moment counts
+}
+
+void WindowStorage::TrustMapped(int width, int height, int border, const PixelRegion& covered,
+                                Nanoseconds now) {
+    SetSize(width, height, border);
+    m_mapped = true;
+    m_proof.Trust({width, height, border}, covered, now);
+    if (!m_proof.IsProven())
+        WatchPaintings(now);
+}
+
+void WindowStorage::OnRenewed(const TopLevel& told, unsigned sequence, Nanoseconds now) {
+    SetSize(told.StorageWidth(), told.StorageHeight(), told.border);
+    Void();
+    const bool wasMapped = std::exchange(m_mapped, told.mapped);
+    if (!m_mapped)
+        return;
+    // When it was resized, its own changes and those of the storage aren't told apart.
+    const bool watched = !wasMapped && m_paintings.IsOn() && m_paintings.Counts(sequence);
+    if (!watched) {
+        WatchPaintings(now);
+        m_connection.Flush(); // each moment counts
+    }
+    m_proof.Renew({m_width, m_height, m_border}, watched, now);
+    m_watchedSince = now;
+    m_reports = 0;
+}
+
+void WindowStorage::OnUnmapped() {
+    m_mapped = false;
+    Void();
+    if (m_paintings.IsOn())
+        return;
+    WatchPaintings(CmSteadyNow());
+    m_connection.Flush(); // before it is mapped again
+}
+
+void WindowStorage::OnGone() {
+    Void();
+    m_paintings.End();
+    m_changes.End();
+}
+
+/// What was fetched shows a storage that isn't the window's any more.
+void WindowStorage::Void() {
+    ForgetPixmap();
+    m_pixels = StoredPixels();
+    m_isPictureOfPixels = false;
+    m_changed = true;
+    ++m_renewals;
+}
+
+bool WindowStorage::OnRearranged(unsigned sequence) {
+    if (m_proof.IsProven())
+        return false;
+    m_proof.OnRearranged(sequence);
+    return m_mapped && m_paintings.IsOn();
+}
+
+bool WindowStorage::OnRearrangedInside(unsigned sequence) {
+    if (m_proof.IsProven() || !m_mapped)
+        return false;
+    m_proof.OnRearrangedInside(sequence, m_paintings.IsOn());
+    ++m_renewals; // what is being fetched may show what was moved
+    return m_paintings.IsOn();
+}
+
+void WindowStorage::Confirm(unsigned sequence) {
+    m_proof.Confirm(sequence);
+    if (m_proof.IsProven())
+        m_paintings.End();
+}
+
+bool WindowStorage::OnDamage(const xcb_damage_notify_event_t& event, unsigned sequence) {
+    if (m_changes.IsOn() && event.damage == m_changes.Get()) {
+        m_changed = m_changed || m_changes.Counts(sequence);
+        return true;
+    }
+    if (!m_paintings.IsOn() || event.damage != m_paintings.Get())
+        return false;
+    const int left = event.area.x + m_border;
+    const int top = event.area.y + m_border;
+    const PixelRect rect{left, top, left + event.area.width, top + event.area.height};
+    if (m_proof.OnDamage({rect, (event.level & MORE_FOLLOW) != 0, sequence}))
+        ++m_renewals;
+    if (++m_reports > MOST_REPORTS)
+        m_paintings.End();
+    return true;
+}
+
+// ---- Watching it
+
+void WindowStorage::WatchPaintings(Nanoseconds now) {
+    // With rearrangements of what is directly inside it. The tree asks for the same where it needs them.
+    constexpr std::uint32_t EVENTS = XCB_EVENT_MASK_PROPERTY_CHANGE | XCB_EVENT_MASK_SUBSTRUCTURE_NOTIFY;
+    xcb_change_window_attributes(m_connection.Get(), m_window, XCB_CW_EVENT_MASK, &EVENTS);
+    m_paintings.Begin(m_connection, m_window, XCB_DAMAGE_REPORT_LEVEL_RAW_RECTANGLES);
+    m_proof.CountFrom(m_paintings.CountsFrom());
+    m_reports = 0;
+    m_watchedSince = now;
+}
+
+void WindowStorage::Ask(const PixelRegion& shape, Nanoseconds now) {
+    if (!m_asked || now - *m_asked > WANTED_TIME)
+        m_proof.StartNudging(now);
+    m_asked = now;
+    PixelRegion missing = m_proof.Unproven();
+    missing.Intersect(shape);
+    if (missing.IsEmpty())
+        m_paintings.End();
+    else if (!m_paintings.IsOn())
+        WatchPaintings(now);
+}
+
+std::optional<std::chrono::nanoseconds> WindowStorage::WatchEnds() const {
+    if (!m_paintings.IsOn() || !m_mapped)
+        return std::nullopt;
+    return std::max(m_watchedSince, m_asked.value_or(Nanoseconds{0})) + WANTED_TIME;
+}
+
+std::optional<std::chrono::nanoseconds> WindowStorage::KeepingEnds() const {
+    if (!m_asked || (m_pixels.block == nullptr && m_picture == nullptr && !m_changes.IsOn()))
+        return std::nullopt;
+    const bool isLast = !m_mapped && m_picture != nullptr;
+    return *m_asked + (isLast ? LAST_PICTURE_TIME : WANTED_TIME);
+}
+
+std::optional<std::chrono::nanoseconds> WindowStorage::NudgeTime() const {
+    if (!m_mapped || !m_asked || !m_paintings.IsOn() || m_proof.IsAnythingUnconfirmed())
+        return std::nullopt;
+    return m_proof.NextNudge();
+}
+
+std::optional<std::chrono::nanoseconds> WindowStorage::NextDue() const {
+    std::optional<Nanoseconds> next;
+    for (const std::optional<Nanoseconds>& due : {WatchEnds(), KeepingEnds(), NudgeTime()}) {
+        if (due && (!next || *due < *next))
+            next = due;
+    }
+    return next;
+}
+
+void WindowStorage::DoDue(Nanoseconds now) {
+    const auto isDue = [now](const std::optional<Nanoseconds>& due) { return due && *due <= now; };
+    if (isDue(WatchEnds()))
+        m_paintings.End();
+    if (isDue(KeepingEnds()))
+        Drop();
+    if (isDue(NudgeTime()))
+        NudgeToPaint(m_connection, m_window, m_border, m_proof.Unproven(), m_proof.TakeNudge(now));
+}
+
+// ---- Fetching it
+
+bool WindowStorage::IsCurrent(int width, int height, const ServerPixels& pixels) const {
+    return !m_changed && m_pixels.IsOf(width, height, pixels) && m_pixels.unproven == m_proof.Unproven();
+}
+
+xcb_pixmap_t WindowStorage::Pixmap() {
+    if (m_pixmap == 0) {
+        m_pixmap = m_connection.NewId();
+        xcb_composite_name_window_pixmap(m_connection.Get(), m_window, m_pixmap);
+    }
+    return m_pixmap;
+}
+
+void WindowStorage::ForgetPixmap() {
+    if (m_pixmap != 0)
+        xcb_free_pixmap(m_connection.Get(), m_pixmap);
+    m_pixmap = 0;
+}
+
+void WindowStorage::CountChanges(xcb_xfixes_region_t parts) {
+    if (!m_changes.IsOn())
+        m_changes.Begin(m_connection, m_window, XCB_DAMAGE_REPORT_LEVEL_NON_EMPTY);
+    m_changes.CountFrom(xcb_damage_subtract(m_connection.Get(), m_changes.Get(), 0, parts).sequence);
+    m_changed = false;
+}
+
+/// Until they are given back there are none.
+StoredPixels WindowStorage::TakePixels() {
+    // If nobody else has the picture, its memory is to be written to.
+    if (m_picture != nullptr && !m_isPictureCopied && IsOnlyShare(m_picture))
+        m_picture.reset();
+    m_isPictureOfPixels = false;
+    return std::exchange(m_pixels, StoredPixels());
+}
+
+void WindowStorage::GivePixels(StoredPixels pixels, bool isChanged) {
+    m_pixels = std::move(pixels);
+    m_isPictureOfPixels = !isChanged && m_picture != nullptr;
+}
+
+// ---- Showing it
+
+PicturePtr WindowStorage::Show(const PixelRect& visible, const PixelRegion& shape, const CGRect& rect) {
+    Look look{visible, shape};
+    look.shown.Intersect(visible);
+    look.shown.Subtract(m_pixels.unproven);
+    if (look.shown.IsEmpty() || m_pixels.block == nullptr)
+        return nullptr;
+    if (m_picture != nullptr && m_isPictureOfPixels && look == m_look)
+        return m_picture;
+    PicturePtr picture =
+        PictureOf(m_pixels.pixels, m_pixels.block, m_pixels.width, visible, look.shown, rect);
+    const bool isCopied = picture->memory != m_pixels.block;
+    if (!isCopied || !m_isPictureCopied || m_picture == nullptr || look != m_look ||
+        !HoldTheSame(*m_picture, *picture))
+        m_picture = std::move(picture);
+    m_isPictureCopied = isCopied;
+    m_isPictureOfPixels = true;
+    m_look = std::move(look);
+    return m_picture;
+}
+
+// ---- Keeping it
+
+std::size_t WindowStorage::KeptBytes() const {
+    std::size_t bytes = m_pixels.block != nullptr ? m_pixels.block->Size() : 0;
+    if (m_picture != nullptr && (m_isPictureCopied || m_pixels.block == nullptr))
+        bytes += m_picture->stride * static_cast<std::size_t>(m_picture->height);
+    return bytes;
+}
+
+bool WindowStorage::IsHeldByOthers() const {
+    return m_picture != nullptr && !IsOnlyShare(m_picture);
+}
+
+void WindowStorage::Drop() {
+    ForgetPixmap();
+    m_changes.End();
+    m_pixels = StoredPixels();
+    m_picture.reset();
+    m_isPictureOfPixels = false;
+    m_changed = true;
+}
+
+} // namespace platform::x11

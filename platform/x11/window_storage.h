@@ -1,0 +1,178 @@
+// SPDX-License-Identifier: Apache-2.0
+#pragma once
+
+#include "platform/pixel_region.h"
+#include "platform/window_server.h"
+#include "platform/x11/paint_proof.h"
+#include "platform/x11/pixel_formats.h"
+#include "platform/x11/shared_pixels.h"
+#include "platform/x11/window_tree.h"
+#include "platform/x11/x11_connection.h"
+
+#include <xcb/damage.h>
+#include <xcb/xcb.h>
+
+#include <chrono>
+#include <cstddef>
+#include <memory>
+#include <optional>
+
+namespace platform::x11 {
+
+/// What was fetched of a storage, as the server sends it.
+struct StoredPixels {
+    std::shared_ptr<SharedPixels> block; ///< Null for nothing.
+    int width = 0;
+    int height = 0;
+    ServerPixels pixels;
+    PixelRegion unproven; ///< What wasn't the window's own when it was fetched.
+
+    std::size_t Stride() const { return pixels.BytesPerRow(width); }
+    bool IsOf(int otherWidth, int otherHeight, const ServerPixels& otherPixels) const {
+        return block != nullptr && width == otherWidth && height == otherHeight && pixels == otherPixels;
+    }
+};
+
+/// A picture of `visible`, an area of pixels that the server sent; what of it is not `shown` is transparent.
+/// It shares the memory when it can.
+PicturePtr PictureOf(const ServerPixels& pixels, const std::shared_ptr<SharedPixels>& block, int width,
+                     const PixelRect& visible, const PixelRegion& shown, const CGRect& rect);
+
+/// A watch for changes or paintings of a window: a Damage object in the server.
+/// Threads: the X thread.
+class DamageWatch {
+public:
+    DamageWatch() = default;
+    ~DamageWatch() { End(); }
+    DamageWatch(const DamageWatch&) = delete;
+    DamageWatch& operator=(const DamageWatch&) = delete;
+
+    void Begin(X11Connection& connection, xcb_window_t window, std::uint8_t level);
+    void End();
+    bool IsOn() const { return m_damage != 0; }
+    xcb_damage_damage_t Get() const { return m_damage; }
+
+    /// What the server told of before it had done the request of that number counts for nothing.
+    void CountFrom(unsigned sequence) { m_sequence = sequence; }
+    bool Counts(unsigned sequence) const { return !IsEarlier(sequence, m_sequence); }
+    unsigned CountsFrom() const { return m_sequence; }
+
+private:
+    X11Connection* m_connection = nullptr;
+    xcb_damage_damage_t m_damage = 0;
+    unsigned m_sequence = 0;
+};
+
+/// One child of the root: what is watched of its storage, and what of its pixels has been fetched.
+/// Threads: the X thread.
+/// Errors:  those of X11Connection.
+class WindowStorage {
+public:
+    using Nanoseconds = std::chrono::nanoseconds;
+
+    /// How long after somebody has asked for it the window counts as wanted.
+    static constexpr Nanoseconds WANTED_TIME = std::chrono::seconds(5);
+    /// How long the last picture of an unmapped window is kept after it was asked for.
+    static constexpr Nanoseconds LAST_PICTURE_TIME = std::chrono::seconds(60);
+
+    WindowStorage(X11Connection& connection, xcb_window_t window);
+    ~WindowStorage();
+    WindowStorage(const WindowStorage&) = delete;
+    WindowStorage& operator=(const WindowStorage&) = delete;
+
+    // What is told of it.
+    void OnAdded(const TopLevel& told, Nanoseconds now);
+    void OnRenewed(const TopLevel& told, unsigned sequence, Nanoseconds now);
+    void OnUnmapped();
+    void OnGone();
+    /// Windows were rearranged beside it or inside it. True when that number is to end soon, since what is
+    /// painted under it doesn't count.
+    bool OnRearranged(unsigned sequence);
+    bool OnRearrangedInside(unsigned sequence);
+    /// Every event with a number below this one is here.
+    void Confirm(unsigned sequence);
+    /// False for what is of no watch of its.
+    bool OnDamage(const xcb_damage_notify_event_t& event, unsigned sequence);
+    /// It was mapped before anybody watched: all that isn't `covered` is its own. The size is with the
+    /// border.
+    void TrustMapped(int width, int height, int border, const PixelRegion& covered, Nanoseconds now);
+
+    // Watching it.
+    void WatchPaintings(Nanoseconds now);
+    const PaintProof& Proof() const { return m_proof; }
+    /// Somebody asks for it; `shape` is all of it that can be seen.
+    void Ask(const PixelRegion& shape, Nanoseconds now);
+    /// Somebody asks for its last picture, since it isn't on the screen.
+    void AskForLast(Nanoseconds now) { m_asked = now; }
+    std::optional<Nanoseconds> Asked() const { return m_asked; }
+    std::optional<Nanoseconds> NextDue() const;
+    /// Lets go of what has been kept too long, and asks the window to paint when it is time to.
+    void DoDue(Nanoseconds now);
+
+    // Fetching it.
+    bool IsCurrent(int width, int height, const ServerPixels& pixels) const;
+    /// Named anew for each storage.
+    xcb_pixmap_t Pixmap();
+    void ForgetPixmap();
+    /// From here on changes count. Gives what was damaged so far to `parts`, which may be 0.
+    void CountChanges(xcb_xfixes_region_t parts);
+    StoredPixels TakePixels();
+    void GivePixels(StoredPixels pixels, bool isChanged);
+
+    int Width() const { return m_width; }
+    int Height() const { return m_height; }
+    int Border() const { return m_border; }
+    bool IsMapped() const { return m_mapped; }
+    /// Grows when what has been fetched before is void.
+    unsigned Renewals() const { return m_renewals; }
+
+    // Showing it.
+    /// Of `visible`, the part of it that is `shape` and proven. Null when nothing is. The same object as long
+    /// as it looks the same.
+    PicturePtr Show(const PixelRect& visible, const PixelRegion& shape, const CGRect& rect);
+    /// The last one that was shown, perhaps null.
+    const PicturePtr& LastShown() const { return m_picture; }
+
+    // Keeping it.
+    std::size_t KeptBytes() const;
+    bool IsHeldByOthers() const;
+    void Drop();
+
+private:
+    struct Look {
+        PixelRect visible;
+        PixelRegion shown;
+        bool operator==(const Look&) const = default;
+    };
+
+    void SetSize(int width, int height, int border);
+    void Void();
+    std::optional<Nanoseconds> WatchEnds() const;
+    std::optional<Nanoseconds> KeepingEnds() const;
+    std::optional<Nanoseconds> NudgeTime() const;
+
+    X11Connection& m_connection;
+    const xcb_window_t m_window;
+    int m_width = 0;
+    int m_height = 0;
+    int m_border = 0;
+    bool m_mapped = false;
+    xcb_pixmap_t m_pixmap = 0;
+    unsigned m_renewals = 0;
+
+    DamageWatch m_changes; // since the pixels were fetched
+    bool m_changed = true;
+    DamageWatch m_paintings; // while not all is proven
+    unsigned m_reports = 0;
+    Nanoseconds m_watchedSince{0};
+    PaintProof m_proof;
+    std::optional<Nanoseconds> m_asked;
+
+    StoredPixels m_pixels;
+    PicturePtr m_picture;
+    Look m_look;
+    bool m_isPictureOfPixels = false;
+    bool m_isPictureCopied = false; // it has memory of its own
+};
+
+} // namespace platform::x11

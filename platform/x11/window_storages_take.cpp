@@ -1,0 +1,290 @@
+// SPDX-License-Identifier: Apache-2.0
+#include "platform/x11/window_storages_state.h"
+#include "util/cm_clock.h"
+#include "util/cm_trace.h"
+
+#include <algorithm>
+#include <cstddef>
+#include <utility>
+#include <vector>
+
+/// Taking a picture of chosen windows.
+namespace platform::x11 {
+
+namespace {
+
+/// How often it is tried without holding the server.
+constexpr int FREE_TRIES = 3;
+
+bool Touch(const CGRect& one, const CGRect& other) {
+    return one.origin.x < other.origin.x + other.size.width &&
+           other.origin.x < one.origin.x + one.size.width &&
+           one.origin.y < other.origin.y + other.size.height &&
+           other.origin.y < one.origin.y + one.size.height;
+}
+
+/// All of a storage that can be seen.
+PixelRegion ShapeOf(const TopLevel& window) {
+    const PixelRect all{0, 0, window.StorageWidth(), window.StorageHeight()};
+    if (!window.shaped)
+        return PixelRegion(all);
+    PixelRegion shape;
+    for (const PixelRect& rect : window.shape)
+        shape.Add(rect);
+    shape.Intersect(all);
+    return shape;
+}
+
+} // namespace
+
+/// One try at one picture.
+class WindowStorages::Taking {
+public:
+    Taking(State& state, const WindowPictureRequest& request, WindowTree& tree)
+        : m_state(state),
+          m_rect(request.rect),
+          m_asked(request.windows),
+          m_tree(tree) {
+        std::sort(m_asked.begin(), m_asked.end());
+    }
+
+    /// Nothing when the stack has changed meanwhile.
+    std::optional<WindowPictureResult> Try(const std::function<void()>& catchUp);
+
+private:
+    /// A layer in the making.
+    struct Part {
+        PictureLayer layer;
+        std::shared_ptr<WindowStorage> storage; // none for what has its picture already
+        ServerPixels pixels;
+        PixelRect visible;
+        PixelRegion shape;
+        unsigned renewals = 0;
+    };
+
+    bool SettleTree(const std::function<void()>& catchUp);
+    void Choose(const WindowSnapshot& snapshot);
+    const WindowInfo* Chosen(const WindowSnapshot& snapshot, CGWindowID id);
+    void AddWallpaper(const WindowInfo& info);
+    void AddWindow(const WindowInfo& info, const TopLevel& window);
+    bool IsTooLarge(const TopLevel& window);
+    void Fetch();
+    bool IsStillTrue(const std::function<void()>& catchUp);
+    WindowPictureResult Result();
+
+    State& m_state;
+    const CGRect m_rect;
+    std::vector<CGWindowID> m_asked; // sorted
+    WindowTree& m_tree;
+    std::uint64_t m_generation = 0;
+    bool m_anyExists = false;
+    std::vector<Part> m_parts; // back to front
+};
+
+std::optional<WindowPictureResult> WindowStorages::Taking::Try(const std::function<void()>& catchUp) {
+    if (!SettleTree(catchUp))
+        return std::nullopt;
+    const std::shared_ptr<const WindowSnapshot> snapshot = m_tree.Snapshot();
+    m_generation = snapshot->Generation();
+    Choose(*snapshot);
+    Fetch();
+    if (!IsStillTrue(catchUp))
+        return std::nullopt;
+    return Result();
+}
+
+/// True when a snapshot can be made of all that was told so far.
+bool WindowStorages::Taking::SettleTree(const std::function<void()>& catchUp) {
+    catchUp();
+    m_state.ConfirmPaintings(catchUp);
+    if (!m_tree.IsSettled())
+        m_tree.Settle();
+    return m_tree.IsSettled() && m_tree.Snapshot()->Generation() == m_tree.Generation();
+}
+
+void WindowStorages::Taking::Choose(const WindowSnapshot& snapshot) {
+    if (m_tree.Wallpaper() != 0) {
+        if (const WindowInfo* const info = Chosen(snapshot, m_state.connection.Root()))
+            AddWallpaper(*info);
+    }
+    const std::vector<const TopLevel*> frontFirst = m_tree.FrontFirst();
+    for (auto window = frontFirst.rbegin(); window != frontFirst.rend(); ++window) {
+        if (const WindowInfo* const info = Chosen(snapshot, (*window)->id))
+            AddWindow(*info, **window);
+    }
+}
+
+/// Null unless it is asked for and may be shown.
+const WindowInfo* WindowStorages::Taking::Chosen(const WindowSnapshot& snapshot, CGWindowID id) {
+    if (id == 0 || !std::binary_search(m_asked.begin(), m_asked.end(), id))
+        return nullptr;
+    const WindowInfo* const info = snapshot.Find(id);
+    if (info == nullptr)
+        return nullptr;
+    m_anyExists = true;
+    return info->sharing != SharingState::None && Touch(info->frame, m_rect) ? info : nullptr;
+}
+
+void WindowStorages::Taking::AddWallpaper(const WindowInfo& info) {
+    const xcb_screen_t& screen = m_state.connection.Screen();
+    const std::optional<ServerPixels> pixels = m_state.PixelsOf(screen.root_depth, screen.root_visual);
+    if (!pixels)
+        return;
+    std::size_t fetched = 0;
+    Part part;
+    part.layer.window = info.id;
+    part.layer.alpha = info.alpha;
+    part.layer.picture =
+        m_state.wallpaper.Take(m_state.Tools(), *pixels, m_tree.Wallpaper(), info.frame, fetched);
+    m_state.CountTraffic(fetched);
+    if (part.layer.picture == nullptr)
+        return;
+    part.layer.frame = {info.frame.origin, part.layer.picture->rect.size};
+    m_parts.push_back(std::move(part));
+}
+
+void WindowStorages::Taking::AddWindow(const WindowInfo& info, const TopLevel& window) {
+    const auto found = m_state.storages.find(window.window);
+    if (found == m_state.storages.end())
+        return;
+    Part part;
+    part.layer.window = info.id;
+    part.layer.frame = info.frame;
+    part.layer.alpha = info.alpha;
+    WindowStorage& storage = *found->second;
+    if (!info.onScreen) {
+        part.layer.picture = storage.LastShown();
+        part.layer.stale = true;
+        storage.AskForLast(CmSteadyNow());
+        if (part.layer.picture != nullptr)
+            m_parts.push_back(std::move(part));
+        return;
+    }
+    const std::optional<ServerPixels> pixels = m_state.PixelsOf(window.depth, window.visual);
+    part.visible = window.VisiblePart();
+    const bool isEmpty = part.visible.left >= part.visible.right || part.visible.top >= part.visible.bottom;
+    if (!pixels || isEmpty || IsTooLarge(window))
+        return;
+    part.pixels = *pixels;
+    part.shape = ShapeOf(window);
+    part.storage = found->second;
+    part.renewals = storage.Renewals();
+    storage.Ask(part.shape, CmSteadyNow());
+    m_parts.push_back(std::move(part));
+}
+
+bool WindowStorages::Taking::IsTooLarge(const TopLevel& window) {
+    const auto width = static_cast<std::size_t>(window.StorageWidth());
+    const auto height = static_cast<std::size_t>(window.StorageHeight());
+    if (width * height * 4 <= LARGEST_STORAGE)
+        return false;
+    if (!std::exchange(m_state.hasTracedSize, true))
+        CmTraceWarning("[WindowStorages]>>window is too large for a picture, ", width, "x", height);
+    return true;
+}
+
+void WindowStorages::Taking::Fetch() {
+    std::vector<StorageFetch> fetches;
+    for (const Part& part : m_parts) {
+        const auto& storage = part.storage;
+        if (storage != nullptr && !storage->IsCurrent(storage->Width(), storage->Height(), part.pixels))
+            fetches.emplace_back(m_state.Tools(), storage, part.pixels);
+    }
+    for (StorageFetch& fetch : fetches)
+        fetch.Ask();
+    for (StorageFetch& fetch : fetches)
+        fetch.AskForRows();
+    for (StorageFetch& fetch : fetches) {
+        fetch.Finish();
+        m_state.CountTraffic(fetch.BytesAskedFor());
+    }
+}
+
+/// Every event that was sent before the last answer is here by now.
+bool WindowStorages::Taking::IsStillTrue(const std::function<void()>& catchUp) {
+    catchUp();
+    if (!m_tree.IsSettled())
+        return false;
+    const bool isRenewed = std::any_of(m_parts.begin(), m_parts.end(), [](const Part& part) {
+        return part.storage != nullptr && part.storage->Renewals() != part.renewals;
+    });
+    return !isRenewed && m_tree.Generation() == m_generation;
+}
+
+WindowPictureResult WindowStorages::Taking::Result() {
+    if (!m_anyExists)
+        return {PictureOutcome::Gone, nullptr};
+    auto picture = std::make_shared<WindowPicture>();
+    for (Part& part : m_parts) {
+        if (part.storage != nullptr)
+            part.layer.picture = part.storage->Show(part.visible, part.shape, part.layer.frame);
+        if (part.layer.picture != nullptr)
+            picture->layers.push_back(std::move(part.layer));
+    }
+    picture->time = CmSteadyNow();
+    picture->generation = m_generation;
+    return {PictureOutcome::Ok, std::move(picture)};
+}
+
+WindowPictureResult WindowStorages::Take(const WindowPictureRequest& request, WindowTree& tree,
+                                         const CGPoint& /*origin*/, const std::function<void()>& catchUp) {
+    const Extensions& has = m_state->connection.Has();
+    if (!has.composite || !has.damage || !has.xfixes)
+        return {PictureOutcome::Unsupported, nullptr};
+    m_state->isDueKnown = false;
+    m_state->Trim();
+    for (int i = 0; i < FREE_TRIES; ++i) {
+        if (auto result = Taking(*m_state, request, tree).Try(catchUp))
+            return *std::move(result);
+    }
+    const ServerGrab grab(m_state->connection);
+    // What was sent before the server was held has to be here first.
+    m_state->connection.RoundTrip();
+    if (auto result = Taking(*m_state, request, tree).Try(catchUp))
+        return *std::move(result);
+    return {PictureOutcome::Stale, nullptr};
+}
+
+// ---- The screen
+
+bool WindowStorages::State::AreAllProven() const {
+    return std::all_of(storages.begin(), storages.end(), [](const auto& each) {
+        return !each.second->IsMapped() || each.second->Proof().IsProven();
+    });
+}
+
+bool WindowStorages::ArePainted(const PixelRect& place, const WindowTree& tree,
+                                const std::function<void()>& catchUp) {
+    State& state = *m_state;
+    state.ConfirmPaintings(catchUp);
+    if (state.AreAllProven())
+        return true;
+    state.isDueKnown = false;
+    bool arePainted = true;
+    PixelRegion uncovered(place);
+    for (const TopLevel* const window : tree.FrontFirst()) {
+        WindowStorage* const storage = state.Find(window->window);
+        if (storage == nullptr || !window->mapped || window->inputOnly)
+            continue;
+        PixelRegion shape = ShapeOf(*window);
+        PixelRegion foreign = storage->Proof().Unproven();
+        foreign.Intersect(shape);
+        foreign.Translate(window->x, window->y);
+        foreign.Intersect(uncovered);
+        if (!foreign.IsEmpty()) {
+            storage->Ask(ShapeOf(*window), CmSteadyNow());
+            arePainted = false;
+        }
+        // Under a compositor nobody knows what shines through.
+        shape.Translate(window->x, window->y);
+        if (!state.composited)
+            uncovered.Subtract(shape);
+    }
+    return arePainted;
+}
+
+std::chrono::nanoseconds WindowStorages::LastPainted() const {
+    return m_state->lastPainted;
+}
+
+} // namespace platform::x11

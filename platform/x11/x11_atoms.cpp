@@ -1,0 +1,45 @@
+// SPDX-License-Identifier: Apache-2.0
+#include "platform/x11/x11_atoms.h"
+
+namespace platform::x11 {
+
+const char* const ATOM_NAMES[static_cast<std::size_t>(AtomName::Count)] = {
+    "WM_STATE",
+    "_NET_WM_NAME",
+    "UTF8_STRING",
+    "_NET_WM_PID",
+    "_NET_WM_STATE",
+    "_NET_WM_STATE_HIDDEN",
+    "_NET_WM_STATE_ABOVE",
+    "_NET_WM_DESKTOP",
+    "_NET_CURRENT_DESKTOP",
+    "_NET_WM_WINDOW_TYPE",
+    "_NET_WM_WINDOW_TYPE_DESKTOP",
+    "_NET_WM_WINDOW_TYPE_DOCK",
+    "_NET_WM_WINDOW_TYPE_TOOLBAR",
+    "_NET_WM_WINDOW_TYPE_MENU",
+    "_NET_WM_WINDOW_TYPE_UTILITY",
+    "_NET_WM_WINDOW_TYPE_SPLASH",
+    "_NET_WM_WINDOW_TYPE_DIALOG",
+    "_NET_WM_WINDOW_TYPE_DROPDOWN_MENU",
+    "_NET_WM_WINDOW_TYPE_POPUP_MENU",
+    "_NET_WM_WINDOW_TYPE_TOOLTIP",
+    "_NET_WM_WINDOW_TYPE_NOTIFICATION",
+    "_NET_WM_WINDOW_TYPE_COMBO",
+    "_NET_WM_WINDOW_TYPE_DND",
+    "_NET_WM_WINDOW_TYPE_NORMAL",
+    "_NET_WM_WINDOW_OPACITY",
+    "_NET_WM_STRUT",
+    "_NET_WM_STRUT_PARTIAL",
+    "_GTK_FRAME_EXTENTS",
+    "_NET_ACTIVE_WINDOW",
+    "_NET_CLIENT_LIST",
+    "_NET_CLIENT_LIST_STACKING",
+    "_NET_SUPPORTING_WM_CHECK",
+    "_XROOTPMAP_ID",
+    "ESETROOT_PMAP_ID",
+    "_NET_WM_CM_S",
+    "EDID",
+};
+
+} // namespace platform::x11

@@ -1,0 +1,176 @@
+// SPDX-License-Identifier: Apache-2.0
+#include "platform/x11/x11_hub.h"
+
+#include "platform/x11/x11_hub_state.h"
+#include "platform/x11/x11_session.h"
+#include "platform/x11/x11_worker.h"
+#include "util/cm_guarded_call.h"
+
+#include <algorithm>
+#include <utility>
+
+namespace platform::x11 {
+
+namespace {
+
+using Lock = HubState::Lock;
+using Phase = HubState::Phase;
+
+} // namespace
+
+std::shared_ptr<X11Hub> X11Hub::Share(std::string display) {
+    return std::shared_ptr<X11Hub>(new X11Hub(std::move(display)), [](const X11Hub* hub) {
+        if (!hub->InForkedChild())
+            delete hub;
+    });
+}
+
+X11Hub::X11Hub(std::string display) : m_display(std::move(display)), m_state(std::make_unique<HubState>()) {}
+
+X11Hub::~X11Hub() {
+    Close();
+}
+
+// ---- Looking
+
+/// As it is when the deadline passes before the first try to connect is over: lost.
+View X11Hub::Look(Nanoseconds deadline) {
+    View lost = m_lost;
+    lost.life.epoch = m_state->Epoch();
+    if (InForkedChild())
+        return lost;
+    const Nanoseconds end = std::min(deadline, CmSteadyNow() + DEFAULT_CONNECT_DEADLINE);
+    Lock lock = m_state->point.Acquire();
+    while (!m_state->IsClosed(lock) && m_state->PhaseNow(lock) != Phase::Settled) {
+        if (m_state->PhaseNow(lock) == Phase::AtRest) {
+            lock.unlock();
+            if (!StartThread())
+                return lost;
+            lock.lock();
+        } else if (CmSteadyNow() < end) {
+            m_state->point.WaitUntil(lock, end);
+        } else {
+            return lost;
+        }
+    }
+    return m_state->IsClosed(lock) ? lost : m_state->Now(lock);
+}
+
+/// False when there is none and none can be started. Also true when another one has ended it meanwhile.
+bool X11Hub::StartThread() {
+    const std::lock_guard<std::mutex> threads(m_state->threadMutex);
+    if (m_state->thread != nullptr)
+        return true;
+    if (m_state->IsClosed(m_state->point.Acquire()))
+        return false;
+    return CmCallGuarded("[X11Hub::StartThread]>>exception: ",
+                         [&] { m_state->thread = X11Worker::Start(*m_state, m_display); }) &&
+           m_state->thread != nullptr;
+}
+
+// ---- Work
+
+PictureOutcome X11Hub::Run(Nanoseconds deadline, Work work) {
+    if (InForkedChild())
+        return PictureOutcome::Lost;
+    const auto command = std::make_shared<Command>();
+    command->work = std::move(work);
+    command->deadline = deadline;
+    Look(deadline);
+    Lock lock = m_state->point.Acquire();
+    if (m_state->IsLost(lock))
+        return PictureOutcome::Lost;
+    if (CmSteadyNow() >= deadline)
+        return PictureOutcome::Timeout;
+    if (!m_state->IsAlive(lock))
+        return PictureOutcome::Lost;
+    m_state->Queue(command, lock);
+    while (command->state != Command::State::Done && CmSteadyNow() < deadline)
+        m_state->point.WaitUntil(lock, deadline);
+    if (command->state == Command::State::Done)
+        return command->outcome;
+    m_state->Withdraw(command, lock);
+    m_state->Stall(lock);
+    return PictureOutcome::Timeout;
+}
+
+// ---- Notices and streams
+
+void X11Hub::SetReceiver(std::shared_ptr<NoticeReceiver> receiver) {
+    if (InForkedChild())
+        return;
+    const bool listens = receiver != nullptr;
+    {
+        const Lock lock = m_state->point.Acquire();
+        if (m_state->IsClosed(lock))
+            return;
+        m_state->SetReceiver(receiver, lock); // the old one ends behind the lock
+        // The new one has heard nothing yet.
+        m_state->Post(
+            [readers = m_state->Readers(lock)](X11Session&) {
+                for (const StreamReaderPtr& reader : readers)
+                    reader->told = false;
+            },
+            lock);
+    }
+    // Whoever listens hears of all that changes from now on, so it must be known what there is now.
+    if (listens)
+        Look();
+}
+
+StreamReaderPtr X11Hub::NewReader(const DisplayStreamRequest& request) {
+    if (InForkedChild())
+        return nullptr;
+    const Lock lock = m_state->point.Acquire();
+    if (!m_state->IsAlive(lock))
+        return nullptr;
+    StreamReaderPtr reader = m_state->NewReader(request, lock);
+    m_state->Post([reader](X11Session& session) { session.AttachReader(reader); }, lock);
+    return reader;
+}
+
+bool X11Hub::IsOver(std::uint64_t epoch) const {
+    if (InForkedChild())
+        return false;
+    const Lock lock = m_state->point.Acquire();
+    return m_state->IsClosed(lock) || m_state->Now(lock).life.life == Life::Lost ||
+           m_state->Now(lock).life.epoch != epoch;
+}
+
+void X11Hub::Forget(const StreamReaderPtr& reader) {
+    if (InForkedChild())
+        return;
+    const Lock lock = m_state->point.Acquire();
+    m_state->Forget(reader, lock);
+    m_state->Post([reader](X11Session& session) { session.DetachReader(reader); }, lock);
+}
+
+// ---- Ends
+
+void X11Hub::Rest() {
+    if (InForkedChild())
+        return;
+    const std::lock_guard<std::mutex> threads(m_state->threadMutex);
+    if (m_state->thread == nullptr)
+        return;
+    m_state->thread->End();
+    {
+        const Lock lock = m_state->point.Acquire();
+        m_state->BeginPhase(Phase::AtRest, -1, lock);
+    }
+    m_state->thread = nullptr;
+    m_state->applications.CloseDescriptors();
+}
+
+void X11Hub::Close() {
+    if (InForkedChild())
+        return;
+    std::shared_ptr<NoticeReceiver> receiver;
+    {
+        const Lock lock = m_state->point.Acquire();
+        m_state->Close(receiver, lock);
+    }
+    Rest();
+}
+
+} // namespace platform::x11
