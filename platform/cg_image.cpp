@@ -9,9 +9,7 @@
 
 namespace platform {
 
-namespace {
-
-CGPixelLayout LayoutOf(PixelFormat format) {
+CGPixelLayout CGPixelLayoutOf(PixelFormat format) noexcept {
     switch (format) {
         case PixelFormat::BGRX:
             return CGPixelLayout::BGRX;
@@ -26,8 +24,6 @@ CGPixelLayout LayoutOf(PixelFormat format) {
     }
     return CGPixelLayout::BGRX;
 }
-
-} // namespace
 
 CGImageRef CGImageCreate(int width, int height, std::size_t bytesPerRow, CGPixelLayout layout,
                          const std::uint8_t* pixels, std::shared_ptr<const void> memory) noexcept {
@@ -53,7 +49,7 @@ CGImageRef CGImageCreateWithPicture(std::shared_ptr<const Picture> picture) noex
     if (picture == nullptr)
         return nullptr;
     const Picture& shown = *picture;
-    return CGImageCreate(shown.width, shown.height, shown.stride, LayoutOf(shown.format), shown.pixels,
+    return CGImageCreate(shown.width, shown.height, shown.stride, CGPixelLayoutOf(shown.format), shown.pixels,
                          std::move(picture));
 }
 

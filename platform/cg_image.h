@@ -9,6 +9,7 @@
 namespace platform {
 
 struct Picture;
+enum class PixelFormat;
 
 /// Bytes of a pixel in memory order, byte 0 first; in the last one, the bits of a little-endian 32-bit word,
 /// high ones first. X carries nothing. Where there is alpha, the colours are premultiplied with it.
@@ -63,6 +64,8 @@ CGDataProviderRef CGImageGetDataProvider(const CGImageRef& image) noexcept;
 std::vector<std::uint8_t> CGDataProviderCopyData(const CGDataProviderRef& provider) noexcept;
 
 /// Bytes.
+/// How the pixels of a window server's picture lie.
+CGPixelLayout CGPixelLayoutOf(PixelFormat format) noexcept;
 std::size_t CGBytesPerPixel(CGPixelLayout layout) noexcept;
 bool CGHasAlpha(CGPixelLayout layout) noexcept;
 

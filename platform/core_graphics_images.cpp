@@ -68,7 +68,7 @@ constexpr int LONGEST_SIDE = 65535;
 /// How often a fetch is begun whose windows were restacked under it.
 constexpr int ATTEMPTS = 3;
 
-bool HasArea(const CGRect& rect) {
+bool IsFiniteArea(const CGRect& rect) {
     return std::isfinite(rect.origin.x) && std::isfinite(rect.origin.y) && std::isfinite(rect.size.width) &&
            std::isfinite(rect.size.height) && rect.size.width > 0 && rect.size.height > 0;
 }
@@ -94,7 +94,7 @@ std::vector<WindowLayer> SeenLayers(const WindowPicture& picture, const Edges& s
                                     std::span<const CGWindowID> windows) {
     std::vector<WindowLayer> layers;
     for (const PictureLayer& layer : picture.layers) {
-        if (!HasArea(layer.frame) || !(layer.alpha > 0) || !IsListed(layer.window, windows))
+        if (!IsFiniteArea(layer.frame) || !(layer.alpha > 0) || !IsListed(layer.window, windows))
             continue;
         WindowLayer one{CGImageCreateWithPicture(layer.picture), Edges(layer.frame), layer.alpha, 1.0F};
         if (one.image == nullptr || !one.edges.Touches(seen))
@@ -202,7 +202,7 @@ CGImageRef DrawWhole(const CGWindowImage& image) {
 
 CGWindowImageRef CGWindowListTakeImage(const CGRect& rect, std::span<const CGWindowID> windows,
                                        unsigned options, bool keepsOut) noexcept {
-    if (windows.empty() || !HasArea(rect))
+    if (windows.empty() || !IsFiniteArea(rect))
         return nullptr;
     CGWindowImageRef image;
     CmCallGuarded("[CGWindowListTakeImage]>>exception: ", [&] {
@@ -232,7 +232,7 @@ bool CGWindowImageIsOpaque(const CGWindowImage* image) noexcept {
 }
 
 bool CGContextDrawWindowImage(CGContext* context, const CGRect& rect, const CGWindowImage* image) noexcept {
-    if (context == nullptr || image == nullptr || !HasArea(rect))
+    if (context == nullptr || image == nullptr || !IsFiniteArea(rect))
         return true;
     CGContextClipToRect(context, rect);
     bool isWhole = true;

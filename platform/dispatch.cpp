@@ -31,6 +31,7 @@ public:
 
     std::atomic<void*> context{nullptr};
     std::atomic<Finalizer> finalizer{nullptr};
+    DispatchQueue* nextUnfinished = nullptr; ///< Of one that has ended and waits for its finaliser.
 
 private:
     bool TakeNext(std::function<void()>& block);
@@ -69,18 +70,45 @@ void StartSerialQueue(const dispatch_queue_t& queue) {
     }
 }
 
-/// What a shared queue ends with, on whichever thread its last share goes.
-void EndQueue(DispatchQueue* queue) {
-    void* const context = queue->context.load();
-    const DispatchQueue::Finalizer finalizer = queue->finalizer.load();
-    delete queue;
-    if (context == nullptr || finalizer == nullptr)
-        return;
-    CmCallGuarded("[DispatchQueue]>>finaliser not run: ", [&] {
-        RunOnPool([finalizer, context] {
+/// Queues that ended when there was no memory to have their finalisers run, the last one first.
+std::atomic<DispatchQueue*> g_unfinished{nullptr};
+
+void AddUnfinished(DispatchQueue* queue) {
+    queue->nextUnfinished = g_unfinished.load();
+    while (!g_unfinished.compare_exchange_weak(queue->nextUnfinished, queue)) {
+    }
+}
+
+/// False without memory; the queue is still there then.
+bool Finish(DispatchQueue* queue) {
+    const bool isPosted = CmCallGuarded("[DispatchQueue]>>finaliser not run yet: ", [&] {
+        RunOnPool([finalizer = queue->finalizer.load(), context = queue->context.load()] {
             CmCallGuarded("[DispatchQueue]>>exception from a finaliser: ", [&] { finalizer(context); });
         });
     });
+    if (isPosted)
+        delete queue;
+    return isPosted;
+}
+
+/// Those that ended without memory, now that there may be some.
+void FinishEarlierOnes() {
+    DispatchQueue* queue = g_unfinished.exchange(nullptr);
+    while (queue != nullptr) {
+        DispatchQueue* const next = queue->nextUnfinished;
+        if (!Finish(queue))
+            AddUnfinished(queue);
+        queue = next;
+    }
+}
+
+/// What a shared queue ends with, on whichever thread its last share goes.
+void EndQueue(DispatchQueue* queue) {
+    FinishEarlierOnes();
+    if (queue->context.load() == nullptr || queue->finalizer.load() == nullptr)
+        delete queue;
+    else if (!Finish(queue))
+        AddUnfinished(queue);
 }
 
 } // namespace
@@ -110,6 +138,7 @@ void DispatchQueue::RunBlocks() {
 }
 
 dispatch_queue_t dispatch_queue_create(const char* label, dispatch_queue_attr_t attribute) noexcept {
+    FinishEarlierOnes();
     dispatch_queue_t queue;
     CmCallGuarded("[dispatch_queue_create]>>exception: ", [&] {
         queue = dispatch_queue_t(new DispatchQueue(label, attribute), EndQueue); // NOLINT: guarded
@@ -121,10 +150,10 @@ const char* dispatch_queue_get_label(const dispatch_queue_t& queue) noexcept {
     return queue != nullptr ? queue->Label().c_str() : "";
 }
 
-void dispatch_async(const dispatch_queue_t& queue, std::function<void()> block) noexcept {
+bool dispatch_async(const dispatch_queue_t& queue, std::function<void()> block) noexcept {
     if (queue == nullptr || block == nullptr)
-        return;
-    CmCallGuarded("[dispatch_async]>>block dropped: ", [&] {
+        return false;
+    return CmCallGuarded("[dispatch_async]>>block dropped: ", [&] {
         if (!queue->IsSerial())
             RunOnPool(ConcurrentBlock{queue, std::move(block)});
         else if (queue->Append(std::move(block)))

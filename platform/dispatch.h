@@ -34,8 +34,9 @@ dispatch_queue_t dispatch_queue_create(const char* label, dispatch_queue_attr_t 
 /// Never null; lives as long as the queue.
 const char* dispatch_queue_get_label(const dispatch_queue_t& queue) noexcept;
 
-/// Takes the block in and returns; it runs later on a thread of the pool.
-void dispatch_async(const dispatch_queue_t& queue, std::function<void()> block) noexcept;
+/// Takes the block in and returns; it runs later on a thread of the pool. False when it never will: for a
+/// null argument, and when there is no memory to keep it.
+bool dispatch_async(const dispatch_queue_t& queue, std::function<void()> block) noexcept;
 
 /// A pointer of the queue's owner, null at first. Nothing here follows it.
 void dispatch_set_context(const dispatch_queue_t& queue, void* context) noexcept;

@@ -98,8 +98,8 @@ Bytes EncodeJpeg(const CGImage& image, float factor) {
 /// A file that is being written.
 class OutputFile {
 public:
-    OutputFile(const std::string& path, int flags)
-        : m_fd(open(path.c_str(), O_WRONLY | O_CREAT | O_CLOEXEC | O_NOCTTY | flags, 0666)) {}
+    OutputFile(const std::string& path, int flags, mode_t mode)
+        : m_fd(open(path.c_str(), O_WRONLY | O_CREAT | O_CLOEXEC | O_NOCTTY | flags, mode)) {}
     ~OutputFile() { Close(); }
     OutputFile(const OutputFile&) = delete;
     OutputFile& operator=(const OutputFile&) = delete;
@@ -145,12 +145,12 @@ std::string TemporaryNameBeside(const std::string& path) {
     return folder + ".screenshare-" + std::to_string(getpid()) + "-" + std::to_string(count++) + ".tmp";
 }
 
-bool WriteAtomically(const Bytes& data, const std::string& path) {
+bool WriteAtomically(const Bytes& data, const std::string& path, mode_t mode) {
     if (!IsReplaceable(path))
         return false;
     const std::string temporary = TemporaryNameBeside(path);
     // One that is there already belongs to somebody else, or is a trap.
-    OutputFile file(temporary, O_EXCL);
+    OutputFile file(temporary, O_EXCL, mode);
     if (!file.IsOpen())
         return false;
     if (file.Write(data) && file.Close() && rename(temporary.c_str(), path.c_str()) == 0)
@@ -159,8 +159,8 @@ bool WriteAtomically(const Bytes& data, const std::string& path) {
     return false;
 }
 
-bool WriteDirectly(const Bytes& data, const std::string& path) {
-    OutputFile file(path, O_TRUNC);
+bool WriteDirectly(const Bytes& data, const std::string& path, mode_t mode) {
+    OutputFile file(path, O_TRUNC, mode);
     return file.IsOpen() && file.Write(data) && file.Close();
 }
 
@@ -185,11 +185,11 @@ Bytes NSBitmapImageRep::representationUsingType(NSBitmapImageFileType type,
     return {};
 }
 
-bool writeToFile(const Bytes& data, const char* path, bool atomically) noexcept {
+bool writeToFile(const Bytes& data, const char* path, bool atomically, mode_t mode) noexcept {
     if (path == nullptr || *path == '\0')
         return false;
     try {
-        return atomically ? WriteAtomically(data, path) : WriteDirectly(data, path);
+        return atomically ? WriteAtomically(data, path, mode) : WriteDirectly(data, path, mode);
     } catch (const std::bad_alloc&) {
         return false;
     }

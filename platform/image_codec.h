@@ -3,6 +3,7 @@
 
 #include "platform/cg_image.h"
 
+#include <sys/types.h>
 #include <cstddef>
 #include <cstdint>
 #include <memory>
@@ -43,7 +44,9 @@ private:
 /// Writes a file. `atomically` means to write under another name in the same folder and rename: who looks
 /// sees the file before or the file after, and nothing is left of an attempt that failed. A link under that
 /// name is then replaced, not followed; anything else that is no plain file is left alone and makes it false.
-bool writeToFile(const std::vector<std::uint8_t>& data, const char* path, bool atomically) noexcept;
+/// `mode` is what a new file lets people do, less the umask; a file written atomically is always a new one.
+bool writeToFile(const std::vector<std::uint8_t>& data, const char* path, bool atomically,
+                 mode_t mode = 0666) noexcept;
 
 /// The type of PNG files.
 constexpr const char* kUTTypePNG = "public.png";

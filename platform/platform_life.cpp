@@ -1,6 +1,7 @@
 // SPDX-License-Identifier: Apache-2.0
 #include "platform/platform_life.h"
 
+#include "platform/av_foundation_life.h"
 #include "platform/dispatch_pool.h"
 #include "platform/notices.h"
 #include "platform/platform_thread.h"
@@ -33,7 +34,8 @@ const EndAtExit g_endAtExit;
 
 void Rest() noexcept {
     const PlatformRestScope resting;
-    // In this order: a handler may dispatch work, and both may call the server.
+    // In this order: sessions dispatch work, a handler may, and all of them may call the server.
+    RestCaptureSessions();
     RestNotices();
     RestPool();
     ForgetPins();
@@ -46,6 +48,7 @@ void Rest() noexcept {
 
 void Wake() noexcept {
     WakeNotices();
+    WakeCaptureSessions();
 }
 
 } // namespace platform

@@ -68,11 +68,28 @@ std::shared_ptr<const WindowSnapshot> PinnedUnder(const std::shared_ptr<WindowSe
 std::shared_ptr<const WindowSnapshot> PinWindows() noexcept {
     const std::shared_ptr<WindowServer> server = WindowServerInUse();
     std::shared_ptr<const WindowSnapshot> windows = server->GetWindows();
+    UnpinWindows();
     try {
         Keep({GetThreadSelfId(), server, windows, CmSteadyNow() + LONGEST_PIN});
     } catch (const std::bad_alloc&) { // NOLINT(bugprone-empty-catch): the walk then sees the desktop move
     }
     return windows;
+}
+
+void UnpinWindows() noexcept {
+    std::shared_ptr<const WindowSnapshot> released; // ends behind the lock
+    Pins& pins = OnePerProcess<Pins>::Get();
+    const std::lock_guard<std::mutex> lock(pins.mutex);
+    const auto pin = std::find_if(pins.list.begin(), pins.list.end(),
+                                  [](const Pin& each) { return each.thread == GetThreadSelfId(); });
+    if (pin == pins.list.end())
+        return;
+    released.swap(pin->windows);
+    pins.list.erase(pin);
+}
+
+std::shared_ptr<const WindowSnapshot> PinnedWindows() noexcept {
+    return PinnedUnder(WindowServerInUse());
 }
 
 std::shared_ptr<const WindowSnapshot> WindowsForLookUp() noexcept {

@@ -14,8 +14,16 @@ namespace platform {
 /// not see the past for ever.
 inline constexpr std::chrono::nanoseconds LONGEST_PIN = std::chrono::milliseconds(100);
 
-/// The windows of now, pinned for the calling thread until it pins others. Never null.
+/// The windows of now, pinned for the calling thread until it pins others. Never null. Without memory
+/// nothing is pinned.
 std::shared_ptr<const WindowSnapshot> PinWindows() noexcept;
+
+/// The calling thread has pinned nothing any more.
+void UnpinWindows() noexcept;
+
+/// The windows that the calling thread has pinned. Null when it has pinned none, when they hold no more, and
+/// when they were pinned under another window server.
+std::shared_ptr<const WindowSnapshot> PinnedWindows() noexcept;
 
 /// The windows that the calling thread has pinned, else those of now. Never null. What was pinned under
 /// another window server counts no more.

@@ -6,6 +6,7 @@
 #include "platform/simulated/scene.h"
 #include "platform/simulated/simulated_window_server.h"
 #include "platform/window_server_choice.h"
+#include "platform/x11/x11_window_server.h"
 #include "util/cm_never_destroyed.h"
 
 #include <pthread.h>
@@ -25,11 +26,20 @@ std::shared_ptr<WindowServer> MakeSimulated() {
     return std::make_shared<SimulatedWindowServer>(DefaultScene());
 }
 
+std::shared_ptr<WindowServer> MakeX11() {
+    return std::make_shared<X11WindowServer>();
+}
+
+std::shared_ptr<WindowServer> MakeWhatIsSeen() {
+    std::shared_ptr<WindowServer> seen = MakeX11WindowServerIfSeen();
+    return seen != nullptr ? seen : MakeNone();
+}
+
 constexpr WindowServerMaker MAKERS[] = {
-    {"auto", MakeNone},
+    {"auto", MakeWhatIsSeen},
     {"none", MakeNone},
     {"simulated", MakeSimulated},
-    {"x11", nullptr},
+    {"x11", MakeX11},
 };
 
 /// Never destroyed: threads may ask for the window server while the process takes its statics down.

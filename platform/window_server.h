@@ -195,12 +195,14 @@ struct Picture {
     float scale = 1.0F; ///< Pixels per point.
     std::chrono::nanoseconds time{0}; ///< When the desktop looked like this.
     /// Of a stream: what is different from this reader's picture before, perhaps more and never less; the
-    /// whole picture at first. A layer tells nothing here: its picture is the same object as long as the
-    /// window's pixels are the same.
+    /// whole picture at first, and nothing where only the generations are others. A layer tells nothing here:
+    /// its picture is the same object as long as the window's pixels are the same.
     std::vector<PixelRect> changed;
     /// Of a display: the generation of the oldest stack that the pixels may still show (where a compositor
     /// lags behind the stack, the one in force a settle time ago), and the generation after the fetch. Only
-    /// when both are equal does the picture show that snapshot. Not used in a layer.
+    /// when both are equal does the picture show that snapshot. Before is 0 where the stack can't be told:
+    /// something may be seen that no snapshot lists, or of a window behind one that hasn't painted yet. Not
+    /// used in a layer.
     std::uint64_t generationBefore = 0;
     std::uint64_t generationAfter = 0;
     std::shared_ptr<const void> memory; ///< Keeps `pixels`.
@@ -287,6 +289,10 @@ public:
 
     /// The newest picture, with what changed since this reader's last one; Nothing when nothing did. Doesn't
     /// wait for a change.
+    ///
+    /// A picture that stands still has new generations all the same when the stack has changed, and once more
+    /// when nothing older can be seen any longer: then it is given again, with nothing changed in it. Who
+    /// asks is told; there are no notices of that.
     virtual DisplayPictureResult TakeNewest(std::chrono::nanoseconds deadline) = 0;
 };
 
@@ -329,8 +335,8 @@ enum class NoticeKind {
     ApplicationEnded,    ///< `pid`; only when the process has ended, and once.
     PermissionChanged,
     LifeChanged,
-    StreamPicture, ///< `stream`: there is something new for that reader. Not repeated until it has taken a
-                   ///< picture.
+    StreamPicture, ///< `stream`: there is something new to be seen for that reader. Not repeated until it has
+                   ///< taken a picture.
 };
 
 struct Notice {

@@ -66,6 +66,7 @@ CGError CGSGetOnScreenWindowCount(CGSConnectionID connection, CGSConnectionID ta
 
 CGError CGSGetOnScreenWindowList(CGSConnectionID connection, CGSConnectionID target, int size, int* list,
                                  int* read) noexcept {
+    UnpinWindows(); // who gets no list must not go by the one before
     if (const CGError error = Check(connection, read))
         return error;
     if (size < 0 || (size > 0 && list == nullptr))
@@ -77,6 +78,11 @@ CGError CGSGetOnScreenWindowList(CGSConnectionID connection, CGSConnectionID tar
             list[place] = static_cast<int>(window);
     });
     return kCGErrorSuccess;
+}
+
+std::uint64_t PinnedWindowGeneration() noexcept {
+    const std::shared_ptr<const WindowSnapshot> pinned = PinnedWindows();
+    return pinned != nullptr ? pinned->Generation() : 0;
 }
 
 CGError CGSGetWindowLevel(CGSConnectionID connection, CGWindowID window, int* level) noexcept {

@@ -38,6 +38,10 @@ CGError CGSGetOnScreenWindowCount(CGSConnectionID connection, CGSConnectionID ta
 CGError CGSGetOnScreenWindowList(CGSConnectionID connection, CGSConnectionID target, int size, int* list,
                                  int* read) noexcept;
 
+/// The generation of the windows that the calling thread's last list has pinned. 0 when it has pinned none,
+/// when they hold no more, and when another window server is in force.
+std::uint64_t PinnedWindowGeneration() noexcept;
+
 CGError CGSGetWindowLevel(CGSConnectionID connection, CGWindowID window, int* level) noexcept;
 
 /// From 0, fully transparent, to 1.

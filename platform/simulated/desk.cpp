@@ -1,6 +1,8 @@
 // SPDX-License-Identifier: Apache-2.0
 #include "platform/simulated/desk.h"
 
+#include "platform/desktop_notices.h"
+
 #include <algorithm>
 #include <memory>
 #include <utility>
@@ -35,7 +37,7 @@ PicturePtr CursorPicture(const SimulatedCursor::Representation& representation,
 
 } // namespace
 
-Desk::Desk(SimulatedDesktop desktop) : m_forks(Forks()), m_beginning(CmSteadyNow()) {
+Desk::Desk(SimulatedDesktop desktop) : m_beginning(CmSteadyNow()) {
     m_generations.emplace_back(m_beginning, m_generation);
     Change([&desktop](SimulatedDesktop& now) { now = std::move(desktop); });
 }

@@ -1,6 +1,7 @@
 // SPDX-License-Identifier: Apache-2.0
 #pragma once
 
+#include "platform/fork_watch.h"
 #include "platform/simulated/desktop_painter.h"
 #include "platform/simulated/operation_script.h"
 #include "platform/simulated/simulated_desktop.h"
@@ -44,6 +45,14 @@ public:
     using Nanoseconds = std::chrono::nanoseconds;
     using Lock = CCmWaitPoint::Lock;
 
+    /// What Picture tells of the stack.
+    struct ShownStacks {
+        std::uint64_t before = 0;
+        std::uint64_t after = 0;
+
+        bool operator==(const ShownStacks&) const = default;
+    };
+
     /// A reader of a display, which its stream and the desk share. Guarded by the lock.
     struct Reader {
         std::uint64_t id = 0;
@@ -53,6 +62,7 @@ public:
         bool told = false;               // that there is something new, which it hasn't taken yet
         std::optional<Nanoseconds> took; // when it took its last picture
         SimulatedPixelsPtr pixels;       // of that picture
+        ShownStacks stacks;              // of that picture
         std::uint64_t looked = 0;        // the looks, and the time, for which nothing new was found
         Nanoseconds lookedElapsed{0};
     };
@@ -75,7 +85,7 @@ public:
 
     /// True in a process forked from the one that made it. Whoever reads it there answers as a lost server
     /// and goes no further.
-    bool InForkedChild() const;
+    bool InForkedChild() const { return m_forks.InChild(); }
 
     // ---- The script's side
 
@@ -137,7 +147,6 @@ private:
         SimulatedPixelsPtr pixels;
     };
 
-    static unsigned Forks();
     CGWindowID FreshWindowId() const;
 
     // Entering.
@@ -178,6 +187,7 @@ private:
     const SimulatedDisplay* DisplayOf(const Reader& reader) const;
     SimulatedPixelsPtr Look(const Reader& reader);
     PictureOutcome TakePicture(Reader& reader, PicturePtr& picture);
+    ShownStacks StacksNow() const { return {OldestGenerationShown(), m_generation}; }
     Picture MakeStreamPicture(const Reader& reader, const SimulatedPixels& newest) const;
     std::optional<Nanoseconds> DueTime(const Reader& reader) const;
     std::optional<Nanoseconds> NextMotion(Nanoseconds elapsed) const;
@@ -188,7 +198,7 @@ private:
     void TellReaders();
     int RunThread(const ACmThread& thread);
 
-    const unsigned m_forks; // forks this process came through
+    const ForkWatch m_forks;
     const Nanoseconds m_beginning;
     OperationScript m_script;
     std::atomic<std::uint64_t> m_epoch{1};

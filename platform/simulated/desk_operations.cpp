@@ -4,8 +4,6 @@
 #include "util/cm_guarded_call.h"
 #include "util/cm_thread.h"
 
-#include <pthread.h>
-
 #include <algorithm>
 #include <new>
 
@@ -13,10 +11,6 @@
 namespace platform {
 
 namespace {
-
-constinit std::atomic<unsigned> g_forks{0};
-
-[[maybe_unused]] const int g_forkHandler = pthread_atfork(nullptr, nullptr, [] { ++g_forks; });
 
 constexpr std::chrono::nanoseconds EVER = std::chrono::nanoseconds::max();
 
@@ -36,10 +30,6 @@ private:
     Desk& m_desk; // joins the thread before it ends
 };
 
-unsigned Desk::Forks() {
-    return g_forks.load(std::memory_order_relaxed);
-}
-
 std::shared_ptr<Desk> Desk::Share(SimulatedDesktop desktop) {
     return std::shared_ptr<Desk>(new Desk(std::move(desktop)), [](const Desk* desk) {
         if (!desk->InForkedChild())
@@ -48,10 +38,6 @@ std::shared_ptr<Desk> Desk::Share(SimulatedDesktop desktop) {
 }
 
 Desk::~Desk() = default;
-
-bool Desk::InForkedChild() const {
-    return m_forks != Forks();
-}
 
 // ---- Entering
 

@@ -67,7 +67,9 @@ PictureOutcome Desk::TakePicture(Reader& reader, PicturePtr& picture) {
     const Nanoseconds now = CmSteadyNow();
     if (reader.took && now < *reader.took + reader.period)
         return PictureOutcome::Nothing;
-    const SimulatedPixelsPtr newest = FindNew(reader);
+    SimulatedPixelsPtr newest = FindNew(reader);
+    if (newest == nullptr && DisplayOf(reader) != nullptr && !(reader.stacks == StacksNow()))
+        newest = reader.pixels;
     if (newest == nullptr) {
         // What the notice was about has gone again; the next one is another.
         reader.told = false;
@@ -76,6 +78,7 @@ PictureOutcome Desk::TakePicture(Reader& reader, PicturePtr& picture) {
     }
     picture = std::make_shared<const Picture>(MakeStreamPicture(reader, *newest));
     reader.pixels = newest;
+    reader.stacks = {picture->generationBefore, picture->generationAfter};
     reader.took = now;
     reader.looked = m_looks;
     reader.lookedElapsed = now - m_beginning;
@@ -91,8 +94,9 @@ Picture Desk::MakeStreamPicture(const Reader& reader, const SimulatedPixels& new
     picture.changed = DifferentRects(reader.pixels != nullptr ? *reader.pixels : SimulatedPixels(), newest);
     if (Tells(SimulatedLie::ChangesForgotten) && !picture.changed.empty())
         picture.changed.pop_back();
-    picture.generationBefore = OldestGenerationShown();
-    picture.generationAfter = m_generation;
+    const ShownStacks stacks = StacksNow();
+    picture.generationBefore = stacks.before;
+    picture.generationAfter = stacks.after;
     return picture;
 }
 

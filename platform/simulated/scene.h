@@ -90,6 +90,20 @@ private:
 /// moves with the clock.
 SimulatedDesktop DefaultScene();
 
+/// A desktop to show a share on.
+struct DemoScene {
+    SimulatedDesktop desktop;
+    pid_t shared = 0;      ///< An application with two windows, one of which lies on both displays.
+    CGWindowID secret = 0; ///< Somebody else's, in front of the first of them; all of it is red.
+};
+
+/// That of DefaultScene, moved about for it, and with titles that can be read.
+DemoScene MakeDemoScene();
+
+/// Whether a colour is one of the secret window's: red leads in it, as in nothing else of that desktop. That
+/// goes for mixtures of its colours, too, and for what mostly consists of them.
+bool LooksSecret(std::uint8_t red, std::uint8_t green, std::uint8_t blue) noexcept;
+
 /// A black arrow with a white edge, for displays of scale 1 and 2.
 SimulatedCursor ArrowCursor();
 

@@ -1,8 +1,9 @@
 // SPDX-License-Identifier: Apache-2.0
 #include "platform/simulated/simulated_desktop.h"
 
+#include "platform/utf8.h"
+
 #include <algorithm>
-#include <string_view>
 #include <utility>
 
 namespace platform {
@@ -36,69 +37,8 @@ void Move(CGPoint& point, float x, float y) {
     point.y += y;
 }
 
-const DisplayInfo* Find(const DisplayList& displays, CGDirectDisplayID id) {
-    const auto found =
-        std::find_if(displays.begin(), displays.end(), [id](const auto& each) { return each.id == id; });
-    return found != displays.end() ? &*found : nullptr;
-}
-
-bool IsMain(const DisplayList& displays, CGDirectDisplayID id) {
-    return !displays.empty() && displays.front().id == id;
-}
-
-unsigned ChangesOf(const DisplayInfo& before, const DisplayInfo& after) {
-    unsigned flags = 0;
-    if (before.bounds.origin != after.bounds.origin)
-        flags |= DisplayMoved | DisplayDesktopShapeChanged;
-    if (before.bounds.size != after.bounds.size)
-        flags |= DisplaySetMode | DisplayDesktopShapeChanged;
-    if (before.scale != after.scale)
-        flags |= DisplaySetMode;
-    return flags;
-}
-
-Notice DisplayNotice(CGDirectDisplayID display, unsigned flags) {
-    Notice notice;
-    notice.kind = NoticeKind::DisplayChanged;
-    notice.display = display;
-    notice.flags = flags;
-    return notice;
-}
-
-bool Lists(const ApplicationList& applications, pid_t pid) {
-    return std::any_of(applications.begin(), applications.end(),
-                       [pid](const ApplicationInfo& each) { return each.pid == pid; });
-}
-
-/// How many bytes the character at the beginning takes; 0 when there is none that UTF-8 allows.
-std::size_t LengthOfCharacter(std::string_view text) {
-    const auto byte = [text](std::size_t place) { return static_cast<unsigned char>(text[place]); };
-    const unsigned first = byte(0);
-    if (first < 0x80)
-        return 1;
-    const std::size_t length = first >= 0xF0 ? 4 : first >= 0xE0 ? 3 : 2;
-    if (first < 0xC2 || first > 0xF4 || text.size() < length)
-        return 0;
-    for (std::size_t place = 1; place < length; ++place) {
-        if ((byte(place) & 0xC0) != 0x80)
-            return 0;
-    }
-    // Overlong forms, surrogates, and what lies beyond the last character.
-    const unsigned second = byte(1);
-    const bool wrong = (first == 0xE0 && second < 0xA0) || (first == 0xED && second > 0x9F) ||
-                       (first == 0xF0 && second < 0x90) || (first == 0xF4 && second > 0x8F);
-    return wrong ? 0 : length;
-}
-
-/// Each byte that is no part of a character becomes the sign for that.
 void MendText(std::string& text) {
-    std::string mended;
-    for (std::string_view rest = text; !rest.empty();) {
-        const std::size_t length = LengthOfCharacter(rest);
-        mended += length != 0 ? rest.substr(0, length) : "\xEF\xBF\xBD";
-        rest.remove_prefix(std::max<std::size_t>(length, 1));
-    }
-    text = std::move(mended);
+    text = MendedUtf8(text);
 }
 
 void MendName(std::string& name, const char* other) {
@@ -115,19 +55,6 @@ void MendIds(std::vector<SimulatedDisplay>& displays) {
     for (SimulatedDisplay& display : displays) {
         if (display.id == 0 || display.id == ALL_BITS)
             display.id = ++last;
-    }
-}
-
-/// A notice for each of `some` that isn't among `others`.
-void AddNotices(std::vector<Notice>& notices, NoticeKind kind, const ApplicationList& some,
-                const ApplicationList& others) {
-    for (const ApplicationInfo& application : some) {
-        if (Lists(others, application.pid))
-            continue;
-        Notice notice;
-        notice.kind = kind;
-        notice.pid = application.pid;
-        notices.push_back(notice);
     }
 }
 
@@ -237,30 +164,6 @@ DisplayList ListDisplays(const SimulatedDesktop& desktop) {
                         display.name});
     }
     return list;
-}
-
-std::vector<Notice> DisplayNotices(const DisplayList& before, const DisplayList& after) {
-    std::vector<Notice> notices;
-    for (const DisplayInfo& display : before) {
-        if (Find(after, display.id) == nullptr)
-            notices.push_back(DisplayNotice(display.id, DisplayRemoved | DisplayDisabled));
-    }
-    for (const DisplayInfo& display : after) {
-        const DisplayInfo* const former = Find(before, display.id);
-        unsigned flags = former != nullptr ? ChangesOf(*former, display) : DisplayAdded | DisplayEnabled;
-        if (IsMain(after, display.id) && !IsMain(before, display.id))
-            flags |= DisplaySetMain;
-        if (flags != 0)
-            notices.push_back(DisplayNotice(display.id, flags));
-    }
-    return notices;
-}
-
-std::vector<Notice> ApplicationNotices(const ApplicationList& before, const ApplicationList& after) {
-    std::vector<Notice> notices;
-    AddNotices(notices, NoticeKind::ApplicationEnded, before, after);
-    AddNotices(notices, NoticeKind::ApplicationLaunched, after, before);
-    return notices;
 }
 
 bool SameStack(const std::vector<WindowInfo>& one, const std::vector<WindowInfo>& other) {

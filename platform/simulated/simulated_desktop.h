@@ -96,12 +96,6 @@ void MoveOriginToMainDisplay(SimulatedDesktop& desktop);
 /// The displays as a window server lists them: without those that mirror another one.
 DisplayList ListDisplays(const SimulatedDesktop& desktop);
 
-/// What a server tells of the step from one list to another, in order: removals, additions, changes.
-std::vector<Notice> DisplayNotices(const DisplayList& before, const DisplayList& after);
-
-/// Launches and ends, in order: ends, launches.
-std::vector<Notice> ApplicationNotices(const ApplicationList& before, const ApplicationList& after);
-
 /// Whether two stacks are of one generation: all but the titles is equal.
 bool SameStack(const std::vector<WindowInfo>& one, const std::vector<WindowInfo>& other);
 
