@@ -16,7 +16,7 @@ namespace {
 
 constexpr const char* CONFIG_DIR = "/tmp/screen_share";
 constexpr const char* CONFIG_FILE = "share_config.json";
-constexpr const char* DUMP_FOLDER = "/img-dump/";
+constexpr const char* DUMP_FOLDER = "/img-dump";
 
 /// Seconds after which a file that was not there is looked for again, and after which a good one is read
 /// again.
@@ -37,7 +37,7 @@ AppShareConfig* AppShareConfig::Instance() {
 
 AppShareConfig::AppShareConfig()
     : m_strConfigDir(ConfigDir()),
-      m_strDumpPathPrefix(m_strConfigDir + DUMP_FOLDER) {}
+      m_strDumpPathPrefix(m_strConfigDir + DUMP_FOLDER + "/") {}
 
 // ---- The file
 
@@ -217,6 +217,10 @@ std::string AppShareConfig::GetCaptureDumpPathNamePrefix() {
         used = index > ringSize ? 0 : index;
     } while (!m_nIndexFile.compare_exchange_weak(index, used + 1));
     return m_strDumpPathPrefix + std::to_string(used);
+}
+
+bool AppShareConfig::IsDumpFolderTrusted() const {
+    return CmIsTrustedFolder(m_strConfigDir) && CmIsTrustedFolder(m_strConfigDir + DUMP_FOLDER);
 }
 
 float AppShareConfig::GetCurrentScale() const {

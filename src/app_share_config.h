@@ -64,6 +64,8 @@ public:
     /// Start of the next dump file's name: the dump folder and a number that goes round from 0 to the ring
     /// size. A new ring size takes effect one call later. Nobody makes the folder.
     std::string GetCaptureDumpPathNamePrefix();
+    /// Whether what is dumped stays with the user: nobody else can have laid a link there or owns the folder.
+    bool IsDumpFolderTrusted() const;
 
     // ---- Settings as they stand
 

@@ -1,6 +1,8 @@
 // SPDX-License-Identifier: Apache-2.0
 #pragma once
 
+#include "platform/core_types.h"
+
 #include <screenshare/share_types.h>
 
 #include <atomic>
@@ -60,4 +62,25 @@ private:
     ShareRelaxed<int> m_top;
     ShareRelaxed<int> m_right;
     ShareRelaxed<int> m_bottom;
+};
+
+/// A rectangle of the desktop whose parts may be of neighbouring writes.
+class ShareRelaxedCGRect {
+public:
+    operator platform::CGRect() const { // NOLINT(google-explicit-constructor)
+        return {{m_x, m_y}, {m_width, m_height}};
+    }
+    ShareRelaxedCGRect& operator=(const platform::CGRect& rect) {
+        m_x = rect.origin.x;
+        m_y = rect.origin.y;
+        m_width = rect.size.width;
+        m_height = rect.size.height;
+        return *this;
+    }
+
+private:
+    ShareRelaxed<float> m_x;
+    ShareRelaxed<float> m_y;
+    ShareRelaxed<float> m_width;
+    ShareRelaxed<float> m_height;
 };

@@ -13,9 +13,9 @@
 /// Runs `call(capturer)` on the worker. -4 at once without a capturer, `whenGone` when there is none by then.
 template <class Call>
 int CShareCaptureEngine::_PostToCapturer(Call call, int whenGone) {
-    if (_GetIShareCapturer() == nullptr)
+    if (!_HasCapturer())
         return SHARE_RESULT_NO_CAPTURER;
-    return RunOnCaptureThread([this, call = std::move(call), whenGone] {
+    return _HandToCaptureThread([this, call = std::move(call), whenGone] {
         const CCmMutexGuard guard(_CapturerMutex());
         const std::shared_ptr<IShareCapturer> capturer = _GetIShareCapturer();
         return static_cast<unsigned>(capturer != nullptr ? call(*capturer) : whenGone);
@@ -77,7 +77,7 @@ int CShareCaptureEngine::RemoveUnSharedWindow(unsigned window) {
 int CShareCaptureEngine::AddUnSharedProcess(unsigned pid) {
     if (pid == SHARE_INVALID_PROCESS)
         return SHARE_RESULT_INVALID_PARAM;
-    if (_GetIShareCapturer() == nullptr)
+    if (!_HasCapturer())
         return SHARE_RESULT_NO_CAPTURER;
     CmTraceInfo("[CShareCaptureEngine::AddUnSharedProcess]>> pid=", pid);
     return _PostToCapturer([pid](IShareCapturer& capturer) { return capturer.AddUnSharedProcess(pid); });
@@ -86,7 +86,7 @@ int CShareCaptureEngine::AddUnSharedProcess(unsigned pid) {
 int CShareCaptureEngine::RemoveUnSharedProcess(unsigned pid) {
     if (pid == SHARE_INVALID_PROCESS)
         return SHARE_RESULT_INVALID_PARAM;
-    if (_GetIShareCapturer() == nullptr)
+    if (!_HasCapturer())
         return SHARE_RESULT_NO_CAPTURER;
     CmTraceInfo("[CShareCaptureEngine::RemoveUnSharedProcess]>> pid=", pid);
     return _PostToCapturer([pid](IShareCapturer& capturer) { return capturer.RemoveUnSharedProcess(pid); });
@@ -115,7 +115,7 @@ bool CShareCaptureEngine::IsWindowShared(unsigned window) {
 int CShareCaptureEngine::AddCaptureShareSource(IShareSource* source) {
     if (source == nullptr)
         return SHARE_RESULT_INVALID_PARAM;
-    if (_GetIShareCapturer() == nullptr)
+    if (!_HasCapturer())
         return SHARE_RESULT_NO_CAPTURER;
     const int type = source->GetSourceType();
     CmTraceInfo("[CShareCaptureEngine::AddCaptureShareSource]>>",
@@ -142,7 +142,7 @@ int CShareCaptureEngine::AddCaptureShareSource(IShareSource* source) {
 int CShareCaptureEngine::RemoveCaptureShareSource(IShareSource* source) {
     if (source == nullptr)
         return SHARE_RESULT_INVALID_PARAM;
-    if (_GetIShareCapturer() == nullptr)
+    if (!_HasCapturer())
         return SHARE_RESULT_NO_CAPTURER;
     CmTraceInfo("[CShareCaptureEngine::RemoveCaptureShareSource]>>eShareSourceType=",
                 static_cast<int>(source->GetSourceType()));
@@ -186,19 +186,41 @@ int CShareCaptureEngine::SetCaptureMode(SCREEN_CAPTURER_TYPE mode) {
     CmTraceInfo("[CShareCaptureEngine::SetCaptureMode]>> old=", static_cast<int>(old),
                 ",new=", static_cast<int>(mode));
     m_eCaptureMode = mode;
-    RunOnCaptureThread([this] {
-        if (_ReCreateShareCapturer())
-            return static_cast<unsigned>(SHARE_RESULT_OK);
-        CmTraceError("[CShareCaptureEngine::SetCaptureMode] failed >> recreate share capturer");
-        return static_cast<unsigned>(SHARE_RESULT_FAILED);
+    const bool isHandedOver = CmCallGuarded("[CShareCaptureEngine::SetCaptureMode]>>fail>>", [this] {
+        RunOnCaptureThread([this] {
+            if (_ReCreateShareCapturer())
+                return static_cast<unsigned>(SHARE_RESULT_OK);
+            CmTraceError("[CShareCaptureEngine::SetCaptureMode] failed >> recreate share capturer");
+            return static_cast<unsigned>(SHARE_RESULT_FAILED);
+        });
     });
-    return SHARE_RESULT_OK;
+    if (isHandedOver)
+        return SHARE_RESULT_OK;
+    config.m_nScreenCapturerType = old; // the capturer is still the one of that mode
+    m_eCaptureMode = old;
+    return SHARE_RESULT_FAILED;
 }
+
+/// For as long as the own capturer is away to be replaced. What a client posts meanwhile finds the new one:
+/// refused, a window that is to be kept out would stay in.
+class CShareCaptureEngine::Replacing {
+public:
+    explicit Replacing(CShareCaptureEngine& engine) : m_engine(engine) {
+        m_engine._MarkCapturerReplaced(m_engine._HasCapturer());
+    }
+    ~Replacing() { m_engine._MarkCapturerReplaced(false); }
+    Replacing(const Replacing&) = delete;
+    Replacing& operator=(const Replacing&) = delete;
+
+private:
+    CShareCaptureEngine& m_engine;
+};
 
 /// Builds the own capturer anew. It gets neither the engine as sink nor the sources: it has to stand on the
 /// context.
 bool CShareCaptureEngine::_ReCreateShareCapturer() {
     AppShareConfig::Instance()->m_bRecreateCapturer = false;
+    const Replacing replacing(*this);
     if (const std::shared_ptr<IShareCapturer> old = _GetOwnCapturer()) {
         _SetOwnCapturer(nullptr);
         // Waits for a notification that is just walking the sinks, so none comes from a half-destroyed
@@ -219,11 +241,15 @@ bool CShareCaptureEngine::_ReCreateShareCapturer() {
         default:
             return false;
     }
-    const std::shared_ptr<IShareCapturer> capturer = MakeOwnCapturer(type, m_spShareCapturerContext);
-    if (capturer == nullptr)
-        return false;
-    _SetOwnCapturer(capturer);
-    return capturer->Reinit();
+    bool isReady = false;
+    CmCallGuarded("[CShareCaptureEngine::_ReCreateShareCapturer]>>fail>>", [&] {
+        const std::shared_ptr<IShareCapturer> capturer = MakeOwnCapturer(type, m_spShareCapturerContext);
+        if (capturer == nullptr)
+            return;
+        _SetOwnCapturer(capturer);
+        isReady = capturer->Reinit();
+    });
+    return isReady;
 }
 
 int CShareCaptureEngine::SetAppShareBackgroundColor(int rgb) {

@@ -120,22 +120,26 @@ ICmEventQueue* CShareCaptureEngine::_GetEventQueue(const std::shared_ptr<ACmThre
 
 /// Posts `fire(port)` to the assist thread. It holds the port and not the engine, so it may outlive the
 /// engine; the sink is looked at again when it fires. Without a sink or an assist thread the notification is
-/// dropped.
+/// dropped; -1 when it is lost because there is no memory for it.
 template <class Fire>
-void CShareCaptureEngine::_PostToSink(Fire fire) {
+int CShareCaptureEngine::_PostToSink(Fire fire) {
     if (!m_sinkPort->HasSink())
-        return;
+        return SHARE_RESULT_OK;
     const std::shared_ptr<ACmThread> thread = _GetAssistThread();
     if (thread == nullptr)
-        return;
+        return SHARE_RESULT_OK;
     ICmEventQueue* queue = _GetEventQueue(thread);
     if (queue == nullptr)
-        return;
+        return SHARE_RESULT_OK;
     auto body = [port = m_sinkPort, fire = std::move(fire)]() mutable {
         const ShareCallOutMark mark; // a trace receiver may call out, too
         fire(*port);
     };
-    queue->PostEvent(new CCmInvokeEvent(std::move(body)), CM_EVENT_PRIORITY_NORMAL);
+    int result = SHARE_RESULT_FAILED;
+    CmCallGuarded("[CShareCaptureEngine::_PostToSink]>>fail>>", [&] {
+        result = queue->PostEvent(new CCmInvokeEvent(std::move(body)), CM_EVENT_PRIORITY_NORMAL);
+    });
+    return result;
 }
 
 int CShareCaptureEngine::OnCaptureStatusChanged(int status) {
@@ -149,14 +153,17 @@ int CShareCaptureEngine::OnCaptureStatusChanged(int status) {
 }
 
 int CShareCaptureEngine::OnCapturedWindowChanged(std::vector<unsigned>& windows) {
-    _PostToSink([windows](ShareSinkPort& port) {
-        TraceWindowList(windows);
-        port.CallSink([&](IShareCaptureEngineSink& sink) {
-            sink.OnCapturedWindowListChanged(windows.empty() ? nullptr : windows.data(),
-                                             static_cast<int>(windows.size()));
+    int result = SHARE_RESULT_FAILED;
+    CmCallGuarded("[CShareCaptureEngine::OnCapturedWindowChanged]>>fail>>", [&] {
+        result = _PostToSink([windows](ShareSinkPort& port) {
+            TraceWindowList(windows);
+            port.CallSink([&](IShareCaptureEngineSink& sink) {
+                sink.OnCapturedWindowListChanged(windows.empty() ? nullptr : windows.data(),
+                                                 static_cast<int>(windows.size()));
+            });
         });
     });
-    return SHARE_RESULT_OK;
+    return result;
 }
 
 int CShareCaptureEngine::OnCapturePositionChanged(int x, int y, int width, int height) {

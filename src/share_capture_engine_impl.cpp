@@ -59,6 +59,16 @@ void ShareCaptureCounters::Load(SHARE_CAPTURE_STATISTIC& statistic) const {
 
 CShareCaptureEngine::CShareCaptureEngine() : m_sinkPort(std::make_shared<ShareSinkPort>()) {
     UseShareLib();
+    try {
+        _MakeParts();
+    } catch (...) {
+        // Nobody calls the destructor of what was never made.
+        _ReleaseParts();
+        throw;
+    }
+}
+
+void CShareCaptureEngine::_MakeParts() {
     m_spShareCapturerContext = MakeShareCapturerContext();
     m_pISharePointing = CreateSharePointing(SHARE_POINTING_TYPE_MOUSE, SHARE_INVALID_DISPLAY);
     m_pShareFrameA = NewFrame();
@@ -78,6 +88,10 @@ CShareCaptureEngine::~CShareCaptureEngine() {
         const CCmMutexGuard guard(m_sinkPort->Mutex());
         m_sinkPort->SetSink(nullptr);
     }
+    _ReleaseParts();
+}
+
+void CShareCaptureEngine::_ReleaseParts() {
     ReleaseAndClear(m_pCursorImg);
     ReleaseAndClear(m_pShareFrameA);
     ReleaseAndClear(m_pShareFrameB);
@@ -105,7 +119,9 @@ int CShareCaptureEngine::Start() {
     if (!lock.owns_lock())
         return SHARE_RESULT_FAILED;
     m_bFirstError = true;
-    if (const int result = _Init(); result != SHARE_RESULT_OK) {
+    int result = SHARE_RESULT_FAILED;
+    CmCallGuarded("[CShareCaptureEngine::Start]>>fail>>", [&] { result = _Init(); });
+    if (result != SHARE_RESULT_OK) {
         CmTraceError("[CShareCaptureEngine::Start]>>fail>>>Init fail");
         return result;
     }
@@ -113,6 +129,7 @@ int CShareCaptureEngine::Start() {
     m_tickFailureStart = 0;
     m_nFailureCount = 0;
     m_bDisplayGone = false;
+    m_spShareCapturerContext->NoteInterruption();
     _InitAssistThread();
     _UpdateShareStatus(SHARE_CAPTURE_ENGINE_STATUS_STARTED);
     return SHARE_RESULT_OK;
@@ -212,6 +229,7 @@ int CShareCaptureEngine::Resume() {
     if (m_eSHARE_CAPTURE_ENGINE_STATUS == SHARE_CAPTURE_ENGINE_STATUS_PAUSED) {
         m_tickFailureStart = 0;
         m_nFailureCount = 0;
+        m_spShareCapturerContext->NoteInterruption();
     }
     if (_MoveStatus(SHARE_CAPTURE_ENGINE_STATUS_PAUSED, SHARE_CAPTURE_ENGINE_STATUS_STARTED))
         return SHARE_RESULT_OK;

@@ -5,16 +5,19 @@
 #include "src/share_capture_task_thread.h"
 #include "src/share_capturer_context.h"
 #include "src/share_sink_port.h"
+#include "util/cm_guarded_call.h"
 #include "util/cm_mutex.h"
 #include "util/cm_thread.h"
 
 #include <screenshare/share_capture_engine.h>
 #include <screenshare/share_pointing.h>
 
+#include <cstdint>
 #include <functional>
 #include <memory>
 #include <mutex>
 #include <string>
+#include <utility>
 #include <vector>
 
 /// What a pass is asked for.
@@ -135,8 +138,11 @@ public:
 protected:
     /// What one pass works out on its way.
     struct Pass;
+    class Replacing;
 
     // Lifecycle (share_capture_engine_impl)
+    void _MakeParts();
+    void _ReleaseParts();
     int _Init();
     int _CheckSource();
     bool _HasSource(IShareCapturer& capturer);
@@ -153,6 +159,9 @@ protected:
     std::shared_ptr<IShareCapturer> _GetIShareCapturer();
     std::shared_ptr<IShareCapturer> _GetOwnCapturer() const;
     void _SetOwnCapturer(std::shared_ptr<IShareCapturer> capturer);
+    /// Whether there is a capturer, or will be when what is posted now runs.
+    bool _HasCapturer();
+    void _MarkCapturerReplaced(bool isBeingReplaced);
     std::shared_ptr<CScreenCaptureTaskThread> _GetWorker() const;
     std::shared_ptr<ACmThread> _GetAssistThread() const;
     /// m_mutexCapturer on the user-customisation kind, null on the others.
@@ -199,11 +208,20 @@ protected:
     void _FallBackToDefaultMode();
     void _NotifyDisplaySize(TVLSize size);
     template <class Fire>
-    void _PostToSink(Fire fire);
+    int _PostToSink(Fire fire);
     bool _CanPost() const;
     ICmEventQueue* _GetEventQueue(const std::shared_ptr<ACmThread>& thread) const;
 
     // Control (share_capture_engine_control)
+    /// RunOnCaptureThread for the client's operations, which must not throw: -1 also when there is no memory
+    /// to hand the call over with.
+    template <class Call>
+    int _HandToCaptureThread(Call call) {
+        int result = SHARE_RESULT_FAILED;
+        CmCallGuarded("[CShareCaptureEngine::RunOnCaptureThread]>>fail>>",
+                      [&] { result = RunOnCaptureThread(std::move(call)); });
+        return result;
+    }
     bool _ReCreateShareCapturer();
     template <class Call>
     int _PostToCapturer(Call call, int whenGone = SHARE_RESULT_FAILED);
@@ -247,6 +265,8 @@ protected:
     ShareRelaxedSize m_sizeCurCaptureMax;
     IShareFrame* m_pShareFrameB = nullptr; // holds one reference
     unsigned m_tickDupStart = 0;           // worker only
+    /// Withdrawals when what the previous frame shows was captured. Worker only.
+    std::uint64_t m_nWithdrawalsOfPrevious = 0;
     ShareRelaxed<bool> m_bCheckDupFrame;
     IShareFrame* m_pCurShareFrame = nullptr;      // worker only
     std::vector<unsigned> m_vecCapturedWindows;   // worker only
@@ -258,6 +278,7 @@ protected:
     ShareRelaxed<bool> m_bDisplayGone;
 
 private:
+    bool m_bReplacingCapturer = false; // guarded by m_mutexHandles
     std::recursive_mutex m_mutexLifecycle;
     std::recursive_mutex m_mutexStatus;
     mutable std::mutex m_mutexHandles;

@@ -38,7 +38,7 @@ int CShareCaptureOwnCapturerEngine::EnableExternalISharePointing(bool) {
 
 template <class Call>
 int CShareCaptureOwnCapturerEngine::_CallOwnCapturer(Call call, bool thenUpdateSize) {
-    return RunOnCaptureThread([this, call = std::move(call), thenUpdateSize] {
+    return _HandToCaptureThread([this, call = std::move(call), thenUpdateSize] {
         const std::shared_ptr<IShareCapturer> capturer = _GetOwnCapturer();
         if (capturer == nullptr)
             return static_cast<unsigned>(SHARE_RESULT_FAILED);
@@ -55,7 +55,7 @@ CShareCaptureDesktopEngine::CShareCaptureDesktopEngine()
 int CShareCaptureDesktopEngine::SelectSharedDisplay(unsigned display) {
     if (display == SHARE_INVALID_DISPLAY)
         return SHARE_RESULT_INVALID_PARAM;
-    if (_GetOwnCapturer() == nullptr)
+    if (!_HasCapturer())
         return SHARE_RESULT_NO_CAPTURER;
     CmTraceInfo("[CShareCaptureEngine::SelectSharedDisplay]>> displayId=", display);
     return _CallOwnCapturer(
@@ -68,7 +68,7 @@ CShareCaptureAppEngine::CShareCaptureAppEngine()
 int CShareCaptureAppEngine::AddSharedProcess(unsigned pid) {
     if (pid == SHARE_INVALID_PROCESS)
         return SHARE_RESULT_INVALID_PARAM;
-    if (_GetOwnCapturer() == nullptr)
+    if (!_HasCapturer())
         return SHARE_RESULT_NO_CAPTURER;
     CmTraceInfo("[CShareCaptureEngine::AddSharedProcess]>> pid=", pid);
     return _CallOwnCapturer([pid](IShareCapturer& capturer) { return capturer.AddSharedProcess(pid); }, true);
@@ -78,7 +78,7 @@ int CShareCaptureAppEngine::AddSharedProcess(unsigned pid) {
 int CShareCaptureAppEngine::RemoveSharedProcess(unsigned pid) {
     if (pid == SHARE_INVALID_PROCESS)
         return SHARE_RESULT_INVALID_PARAM;
-    if (_GetOwnCapturer() == nullptr)
+    if (!_HasCapturer())
         return SHARE_RESULT_NO_CAPTURER;
     CmTraceInfo("[CShareCaptureEngine::RemoveSharedProcess]>> pid=", pid);
     return _CallOwnCapturer([pid](IShareCapturer& capturer) { return capturer.RemoveSharedProcess(pid); },

@@ -55,6 +55,7 @@ void CShareCaptureEngine::_CaptureProcess(unsigned mask) {
     pass.startTick = ShareTickNow();
     pass.wantCursor = (mask & SHARE_CAPTURE_MASK_POINTER) != 0;
     pass.scale = AppShareConfig::Instance()->GetCurrentScale();
+    pass.withdrawals = m_spShareCapturerContext->Withdrawals();
 
     if (!_CaptureStep(pass))
         return;
@@ -67,6 +68,7 @@ void CShareCaptureEngine::_CaptureProcess(unsigned mask) {
     if (!pass.gotContent) {
         _ReportNoContent(pass);
     } else if (!pass.reused && !m_bForceFrame && _CheckFrameDuplicate(pass.frame)) {
+        m_nWithdrawalsOfPrevious = pass.withdrawals; // it shows what this one does
         return;
     } else {
         _DeliverPass(pass);
@@ -109,8 +111,14 @@ void CShareCaptureEngine::_PrepareDump(Pass& pass) {
         return;
     pass.dumpContent = config.IsCaptureDumpDataEnabled();
     pass.dumpPoint = config.IsCaptureDumpPointDataEnabled();
-    if (pass.dumpContent || pass.dumpPoint)
-        pass.dumpName = config.GetCaptureDumpPathNamePrefix();
+    if (!pass.dumpContent && !pass.dumpPoint)
+        return;
+    pass.dumpName = config.GetCaptureDumpPathNamePrefix();
+    // The folder may lie where everybody can write, and a picture of a screen is nobody else's.
+    if (!config.IsDumpFolderTrusted()) {
+        pass.dumpContent = false;
+        pass.dumpPoint = false;
+    }
 }
 
 /// False when there is no capturer and the pass is over.
@@ -173,8 +181,9 @@ void CShareCaptureEngine::_ReportWindowList() {
     m_spShareCapturerContext->GetCapturedWindows(m_vecWindowsOfThisPass);
     if (m_vecWindowsOfThisPass == m_vecCapturedWindows)
         return;
-    m_vecCapturedWindows = m_vecWindowsOfThisPass;
-    OnCapturedWindowChanged(m_vecCapturedWindows);
+    // A list that could not be told is told with the next pass.
+    if (OnCapturedWindowChanged(m_vecWindowsOfThisPass) == SHARE_RESULT_OK)
+        m_vecCapturedWindows.swap(m_vecWindowsOfThisPass);
 }
 
 void CShareCaptureEngine::_ReadScale(Pass& pass) {
@@ -194,10 +203,13 @@ void CShareCaptureEngine::_ReadScale(Pass& pass) {
 }
 
 /// Something is being dragged, or a session has nothing new: the sink still gets a picture about once a
-/// second.
+/// second. Not one that may show what has been kept out since.
 void CShareCaptureEngine::_ReusePreviousFrame(Pass& pass) {
     IShareFrame* previous = _GetPreShareFrame();
-    if (previous == nullptr)
+    if (previous == nullptr || m_spShareCapturerContext->Withdrawals() != m_nWithdrawalsOfPrevious)
+        return;
+    // Made larger when there was no memory, it has lost its pixels and tells a length all the same.
+    if (previous->GetFrameData() == nullptr && previous->GetFrameDataLen() > 0)
         return;
     const unsigned last = m_tickLastCapture;
     const bool due = last != 0 && ShareTickNow() - last > RESEND_AFTER_MS;
@@ -232,6 +244,7 @@ void CShareCaptureEngine::_DeliverPass(Pass& pass) {
     if (!pass.reused) {
         if (IShareFrame* other = _GetPreShareFrame())
             m_pCurShareFrame = other;
+        m_nWithdrawalsOfPrevious = pass.withdrawals;
     }
     m_bForceFrame = false;
     if (pass.dumpContent)

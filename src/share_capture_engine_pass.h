@@ -3,6 +3,7 @@
 
 #include "src/share_capture_engine_impl.h"
 
+#include <cstdint>
 #include <string>
 
 /// What one pass works out on its way from the tick to the sink.
@@ -18,6 +19,7 @@ struct CShareCaptureEngine::Pass {
     int result = SHARE_CAPTURE_FAILED;
     float scale = 1.0F; // frame pixels per point
     bool reused = false;
+    std::uint64_t withdrawals = 0; // of the context when the pass began
     bool cursorOk = true;
 
     bool IsTemporaryResult() const {

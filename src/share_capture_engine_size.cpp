@@ -28,9 +28,14 @@ int CShareCaptureEngine::SetCaptureMaxFrameSize(unsigned width, unsigned height)
     if (size == TVLSize(m_sizeCaptureMax))
         return SHARE_RESULT_OK;
     CmTraceInfo("[CShareCaptureEngine::SetCaptureMaxFrameSize] nWidth=", width, ",nHeight=", height);
+    const TVLSize former = m_sizeCaptureMax;
     m_sizeCaptureMax = size;
-    _UpdateCaptureMaxFrameSize(size);
-    return SHARE_RESULT_OK;
+    const bool isHandedOver = CmCallGuarded("[CShareCaptureEngine::SetCaptureMaxFrameSize]>>fail>>",
+                                            [&] { _UpdateCaptureMaxFrameSize(size); });
+    if (isHandedOver)
+        return SHARE_RESULT_OK;
+    m_sizeCaptureMax = former; // or the client could not ask for it again
+    return SHARE_RESULT_FAILED;
 }
 
 void CShareCaptureEngine::_UpdateCaptureMaxFrameSize(TVLSize size) {
@@ -73,9 +78,9 @@ void CShareCaptureEngine::_CalculateUpdateRect(const Pass& pass, int width, int 
     TVLRegion region;
     m_spShareCapturerContext->GetSharedWindowRegion(region);
     region.ProjectRgn(pass.frame->GetMetaInfo().rectCapture, pass.scale);
-    region.GetRgnBox(rcUpdate);
+    const bool isKnown = region.GetRgnBox(rcUpdate);
     // Never cut to the frame: a box that sticks out counts as none.
-    if (!LiesInside(rcUpdate, width, height))
+    if (!isKnown || !LiesInside(rcUpdate, width, height))
         rcUpdate = TVLRect{};
     _CalculateNewCaptureMaxFrameSize(rcUpdate, TVLSize{width, height});
 }
@@ -121,12 +126,12 @@ void CShareCaptureEngine::_UpdateShareDisplaySize(TVLSize size) {
     const bool changed = TVLSize(m_sizeShareDisplay) != size;
     m_sizeShareDisplay = size;
     // A capturer may call from a thread of its own, while a pass is writing into a frame.
-    RunOnCaptureThread([this, size] {
+    _HandToCaptureThread([this, size] {
         _UpdateIShareFrameSize(size);
         return static_cast<unsigned>(SHARE_RESULT_OK);
     });
     if (_GetOwnCapturer() != nullptr) {
-        RunOnCaptureThread([this] {
+        _HandToCaptureThread([this] {
             const std::shared_ptr<IShareCapturer> own = _GetOwnCapturer();
             if (own == nullptr)
                 return static_cast<unsigned>(SHARE_RESULT_NO_CAPTURER);

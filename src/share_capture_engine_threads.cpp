@@ -1,5 +1,6 @@
 // SPDX-License-Identifier: Apache-2.0
 #include "src/app_share_config.h"
+#include "src/share_call_out.h"
 #include "src/share_capture_engine_impl.h"
 #include "util/cm_trace.h"
 
@@ -13,12 +14,31 @@ namespace {
 
 constexpr const char* ASSIST_THREAD_NAME = "scn-cap-assist-{6F923E32-2392-4FE0-9F9E-BBE5C305E053}";
 
+/// Cancels an engine's timer on the assist thread. It belongs to whoever waits for it: an engine has to end
+/// also when there is no memory for an event.
+class CancelEvent final : public ICmEvent {
+public:
+    explicit CancelEvent(CCmTimerWrapperID& timer) : m_timer(timer) {}
+
+    int OnEventFire() override {
+        m_timer.Cancel(false);
+        return 0;
+    }
+    void OnDestorySelf() override {}
+
+private:
+    CCmTimerWrapperID& m_timer;
+};
+
 } // namespace
 
 int CShareCaptureEngine::_CreateCaptureThread() {
     std::shared_ptr<CScreenCaptureTaskThread> worker = _GetWorker();
     if (worker == nullptr) {
-        worker = std::make_shared<CScreenCaptureTaskThread>();
+        CmCallGuarded("[CShareCaptureEngine::_CreateCaptureThread]>>fail>>",
+                      [&] { worker = std::make_shared<CScreenCaptureTaskThread>(); });
+        if (worker == nullptr)
+            return SHARE_RESULT_FAILED;
         const std::lock_guard<std::mutex> lock(m_mutexHandles);
         m_pCScreenCaptureTaskThread = worker;
     }
@@ -124,9 +144,11 @@ void CShareCaptureEngine::_FinitAssistThread() {
     if (thread == nullptr)
         return;
     if (ICmEventQueue* queue = _GetEventQueue(thread)) {
-        // Behind every event of this engine that waits already, so none is left when it returns.
-        const auto cancel = [this] { m_timerAssist.Cancel(false); };
-        queue->SendEvent(new CCmInvokeEvent(cancel));
+        // Behind every event of this engine that waits already, so none is left when it returns. Not from
+        // inside a callback of another engine: an event that waits for that callback would be waited for.
+        CancelEvent cancel(m_timerAssist);
+        if (ShareCallOutMark::IsSet() || queue->SendEvent(&cancel) != 0)
+            m_timerAssist.Cancel(false);
     }
     ACmThreadSingletonFactory::Instance()->ResleseSingletonThread(ASSIST_THREAD_NAME, thread.get());
 }
@@ -155,6 +177,18 @@ void CShareCaptureEngine::_SetOwnCapturer(std::shared_ptr<IShareCapturer> captur
     // The old one goes after the lock, since its destructor calls out.
     const std::lock_guard<std::mutex> lock(m_mutexHandles);
     m_pIShareCapturer.swap(capturer);
+}
+
+bool CShareCaptureEngine::_HasCapturer() {
+    if (m_eSHARE_CAPTURE_ENGINE_TYPE == SHARE_CAPTURE_ENGINE_TYPE_USER_CUSTOMIZATION)
+        return _GetIShareCapturer() != nullptr;
+    const std::lock_guard<std::mutex> lock(m_mutexHandles);
+    return m_bReplacingCapturer || m_pIShareCapturer != nullptr;
+}
+
+void CShareCaptureEngine::_MarkCapturerReplaced(bool isBeingReplaced) {
+    const std::lock_guard<std::mutex> lock(m_mutexHandles);
+    m_bReplacingCapturer = isBeingReplaced;
 }
 
 std::shared_ptr<CScreenCaptureTaskThread> CShareCaptureEngine::_GetWorker() const {

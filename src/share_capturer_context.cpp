@@ -83,13 +83,17 @@ int Add(std::recursive_mutex& mutex, const ValueKind& kind, unsigned value, cons
     return SHARE_RESULT_OK;
 }
 
-int Remove(std::recursive_mutex& mutex, const ValueKind& kind, unsigned value, const Change& off) {
+template <class AlsoWhenRemoved = decltype(NOTHING_MORE)>
+int Remove(std::recursive_mutex& mutex, const ValueKind& kind, unsigned value, const Change& off,
+           AlsoWhenRemoved alsoWhenRemoved = NOTHING_MORE) {
     if (!IsValid(off.operation, kind, value))
         return SHARE_RESULT_INVALID_PARAM;
     std::optional<std::size_t> removed;
     {
         const Guard lock(mutex);
         removed = Erase(off.list, value);
+        if (removed)
+            alsoWhenRemoved();
     }
     if (!removed)
         return SHARE_RESULT_FAILED;
@@ -122,6 +126,10 @@ int BoxOf(std::recursive_mutex& mutex, const TVLRegion& region, TVLRect& rect) {
 
 ShareCapturerContext::ShareCapturerContext() {
     m_sizeCaptureMax = TVLSize{2880, 1800};
+    // What a client was told is kept out is kept out also when there is no memory left by then.
+    constexpr std::size_t ROOM_FOR_KEPT_OUT = 256;
+    m_vUnSharedWindows.reserve(ROOM_FOR_KEPT_OUT);
+    m_vUnSharedApps.reserve(ROOM_FOR_KEPT_OUT);
 }
 
 ShareCapturerContext::~ShareCapturerContext() = default;
@@ -142,38 +150,45 @@ int ShareCapturerContext::InitDisplays() {
 
 int ShareCapturerContext::AddSharedWindow(unsigned window) {
     return Add(m_paramLock, WINDOW, window, {"AddSharedWindow", m_vSharedWindows},
-               {"RemoveUnSharedWindow", m_vUnSharedWindows});
+               {"RemoveUnSharedWindow", m_vUnSharedWindows}, [this] { ++m_nAdmissions; });
 }
 
 int ShareCapturerContext::RemoveSharedWindow(unsigned window) {
-    return Remove(m_paramLock, WINDOW, window, {"RemoveSharedWindow", m_vSharedWindows});
+    return Remove(m_paramLock, WINDOW, window, {"RemoveSharedWindow", m_vSharedWindows},
+                  [this] { ++m_nWithdrawals; });
 }
 
 int ShareCapturerContext::AddUnSharedWindow(unsigned window) {
     return Add(m_paramLock, WINDOW, window, {"AddUnSharedWindow", m_vUnSharedWindows},
-               {"RemoveSharedWindow", m_vSharedWindows});
+               {"RemoveSharedWindow", m_vSharedWindows}, [this] { ++m_nWithdrawals; });
 }
 
 int ShareCapturerContext::RemoveUnSharedWindow(unsigned window) {
-    return Remove(m_paramLock, WINDOW, window, {"RemoveUnSharedWindow", m_vUnSharedWindows});
+    return Remove(m_paramLock, WINDOW, window, {"RemoveUnSharedWindow", m_vUnSharedWindows},
+                  [this] { ++m_nAdmissions; });
 }
 
 int ShareCapturerContext::AddSharedApp(unsigned pid) {
     return Add(m_paramLock, PROCESS, pid, {"AddSharedApp", m_vSharedApps},
-               {"RemoveUnSharedApp", m_vUnSharedApps}, [this] { m_eShareType = SHARE_TYPE_APP; });
+               {"RemoveUnSharedApp", m_vUnSharedApps}, [this] {
+                   m_eShareType = SHARE_TYPE_APP;
+                   ++m_nAdmissions;
+               });
 }
 
 int ShareCapturerContext::RemoveSharedApp(unsigned pid) {
-    return Remove(m_paramLock, PROCESS, pid, {"RemoveSharedApp", m_vSharedApps});
+    return Remove(m_paramLock, PROCESS, pid, {"RemoveSharedApp", m_vSharedApps},
+                  [this] { ++m_nWithdrawals; });
 }
 
 int ShareCapturerContext::AddUnSharedApp(unsigned pid) {
     return Add(m_paramLock, PROCESS, pid, {"AddUnSharedApp", m_vUnSharedApps},
-               {"RemoveSharedApp", m_vSharedApps});
+               {"RemoveSharedApp", m_vSharedApps}, [this] { ++m_nWithdrawals; });
 }
 
 int ShareCapturerContext::RemoveUnSharedApp(unsigned pid) {
-    return Remove(m_paramLock, PROCESS, pid, {"RemoveUnSharedApp", m_vUnSharedApps});
+    return Remove(m_paramLock, PROCESS, pid, {"RemoveUnSharedApp", m_vUnSharedApps},
+                  [this] { ++m_nAdmissions; });
 }
 
 // ---- Displays: the list and the tables made from it change under one hold of the lock.
@@ -194,6 +209,7 @@ int ShareCapturerContext::RemoveSharedDisplay(unsigned display) {
         return SHARE_RESULT_INVALID_PARAM;
     const Guard lock(m_displayLock);
     if (const std::optional<std::size_t> before = Erase(m_vSharedDisplays, display)) {
+        ++m_nWithdrawals;
         TraceChange("RemoveSharedDisplay", DISPLAY, display, *before);
         InitDisplays();
     }
@@ -203,6 +219,7 @@ int ShareCapturerContext::RemoveSharedDisplay(unsigned display) {
 int ShareCapturerContext::ClearSharedDisplay() {
     const Guard lock(m_displayLock);
     m_vSharedDisplays.clear();
+    ++m_nWithdrawals;
     return SHARE_RESULT_OK;
 }
 
@@ -314,6 +331,10 @@ int ShareCapturerContext::GetOverlapRegion(TVLRegion& region) const {
 
 int ShareCapturerContext::GetVisiableRegion(TVLRegion& region) const {
     return CopyOut(m_paramLock, m_rgnVisible, region);
+}
+
+int ShareCapturerContext::GetExposedRegion(TVLRegion& region) const {
+    return CopyOut(m_paramLock, m_rgnExposed, region);
 }
 
 int ShareCapturerContext::GetSharedWindowRegion(TVLRegion& region) const {

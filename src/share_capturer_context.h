@@ -6,6 +6,8 @@
 
 #include <screenshare/share_types.h>
 
+#include <atomic>
+#include <cstdint>
 #include <map>
 #include <mutex>
 #include <optional>
@@ -50,6 +52,19 @@ public:
     int AddUnSharedApp(unsigned pid);
     int RemoveUnSharedApp(unsigned pid);
 
+    /// How often something was withdrawn from what may be seen: kept out, or no longer shared. A picture that
+    /// was begun at another count may show what must not be seen by now.
+    std::uint64_t Withdrawals() const { return m_nWithdrawals.load(); }
+
+    /// How often something was let in: shared, or no longer kept out. A picture of before may show what was
+    /// not to be seen then.
+    std::uint64_t Admissions() const { return m_nAdmissions.load(); }
+
+    /// The share goes on after a time in which nobody was to see it.
+    void NoteInterruption() { ++m_nInterruptions; }
+    /// How often that was. A picture that was begun at another count may be of such a time.
+    std::uint64_t Interruptions() const { return m_nInterruptions.load(); }
+
     /// 0 whatever InitDisplays gave.
     int AddSharedDisplay(unsigned display);
     /// 0 for an absent display, too.
@@ -85,6 +100,12 @@ public:
     bool IsAppShared(unsigned pid) const;
     bool IsAppUnShared(unsigned pid) const;
     bool IsWindowShared(unsigned window) const;
+    /// For a window of a walk or a look that judged it as shared: looks its owner up once more. A verdict
+    /// that was made while the window server failed took the window for nobody's, whom nobody keeps out. True
+    /// for one whose owner can't be told now or is kept out, unless the window itself is shared.
+    bool MayBeKeptOut(unsigned window) const;
+    /// Whether there may be something that a picture of a whole display must not show.
+    bool KeepsOut() const;
     /// Doesn't look at the shared windows: a shared window of an application that isn't shared is both.
     bool IsWindowUnShared(unsigned window) const;
 
@@ -110,6 +131,11 @@ public:
     int GetInvisiableRegion(TVLRegion& region) const;
     /// The displays less the visible and the overlap region.
     int GetBackgroundInvisiableRegion(TVLRegion& region) const;
+    /// What a picture of the displays as they are seen shows of windows that are not kept. Only found while
+    /// m_bFindsExposed, else empty.
+    int GetExposedRegion(TVLRegion& region) const;
+    /// The generation of the windows that were walked; 0 when that can't be told, or nothing was walked.
+    std::uint64_t WalkedGeneration() const { return m_nWalkedGeneration; }
     /// -1 and all zeros when the region is empty.
     int GetSharedWindowBoxRect(TVLRect& rect) const;
     int GetDisplayBoxRect(TVLRect& rect) const;
@@ -117,6 +143,8 @@ public:
     /// The kept windows are not cut out: frames show the whole display.
     ShareRelaxed<bool> m_bNoWindowBaseArea{true};
     ShareRelaxed<bool> m_bExcludeMenuBar{false};
+    /// For who starts from such a picture instead of from the kept windows' own ones.
+    ShareRelaxed<bool> m_bFindsExposed{false};
 
 protected:
     /// What one walk finds. Its vectors change places with the published ones, so their memory is used again.
@@ -125,6 +153,7 @@ protected:
         TVLRegion rgnVisible;
         TVLRegion rgnSharedWindow;
         TVLRegion rgnApplications;
+        TVLRegion rgnExposed;
         std::vector<unsigned> vCapturedWindows;
         std::vector<unsigned> vCapturedExcludedWindows;
         std::vector<unsigned> vAppDisplays;
@@ -158,6 +187,9 @@ protected:
     ShareRelaxed<int> m_nCaptureFps{5};
     mutable std::recursive_mutex m_paramLock;
     mutable std::recursive_mutex m_displayLock;
+    std::atomic<std::uint64_t> m_nWithdrawals{0};
+    std::atomic<std::uint64_t> m_nAdmissions{0};
+    std::atomic<std::uint64_t> m_nInterruptions{0};
     std::vector<unsigned> m_vSharedWindows;
     std::vector<unsigned> m_vUnSharedWindows;
     std::vector<unsigned> m_vSharedApps;
@@ -175,6 +207,8 @@ protected:
     std::map<unsigned, TVLRect> m_mapDisplayRects;
     std::map<unsigned, TVLSize> m_mapDisplaySizes;
     TVLRegion m_rgnApplications;
+    TVLRegion m_rgnExposed;
+    ShareRelaxed<std::uint64_t> m_nWalkedGeneration{0};
     ShareRelaxed<SHARE_TYPE> m_eShareType{SHARE_TYPE_DESKTOP};
     /// Belongs to the thread of the walk.
     ParamSet m_paramSet;

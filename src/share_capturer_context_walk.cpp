@@ -1,4 +1,5 @@
 // SPDX-License-Identifier: Apache-2.0
+#include "platform/window_services.h"
 #include "src/app_share_config.h"
 #include "src/mac/share_util_mac.h"
 #include "src/share_capturer_context.h"
@@ -44,7 +45,7 @@ void PutFirst(std::vector<unsigned>& displays, unsigned display) {
 } // namespace
 
 void ShareCapturerContext::ParamSet::reset() {
-    for (TVLRegion* region : {&rgnOverlap, &rgnVisible, &rgnSharedWindow, &rgnApplications})
+    for (TVLRegion* region : {&rgnOverlap, &rgnVisible, &rgnSharedWindow, &rgnApplications, &rgnExposed})
         region->SetRectRgn(0, 0, 0, 0);
     vCapturedWindows.clear();
     vCapturedExcludedWindows.clear();
@@ -52,6 +53,25 @@ void ShareCapturerContext::ParamSet::reset() {
 }
 
 // ---- Verdicts
+
+bool ShareCapturerContext::MayBeKeptOut(unsigned window) const {
+    platform::CGSConnectionID owner = 0;
+    pid_t pid = 0;
+    const platform::CGSConnectionID connection = platform::CGSDefaultConnection();
+    const platform::CGError error = platform::CGSGetWindowOwner(connection, window, &owner);
+    if (error == platform::kCGErrorFailure)
+        return false; // really nobody's
+    if (error == platform::kCGErrorSuccess &&
+        platform::CGSConnectionGetPID(owner, &pid) == platform::kCGErrorSuccess &&
+        !IsAppUnShared(static_cast<unsigned>(pid)))
+        return false;
+    const Guard lock(m_paramLock);
+    return !Contains(m_vSharedWindows, window);
+}
+
+bool ShareCapturerContext::KeepsOut() const {
+    return m_eShareType != SHARE_TYPE_DESKTOP || GetUnSharedWindowCount() > 0 || GetUnSharedAppCount() > 0;
+}
 
 bool ShareCapturerContext::IsFilterOutSystemProcess(unsigned) const {
     return false;
@@ -201,6 +221,7 @@ void ShareCapturerContext::_CommitParamSet(ParamSet& found) {
         m_rgnVisible.CopyRgn(found.rgnVisible);
         m_rgnSharedWindow.CopyRgn(found.rgnSharedWindow);
         m_rgnApplications.CopyRgn(found.rgnApplications);
+        m_rgnExposed.CopyRgn(found.rgnExposed);
         m_vCapturedWindows.swap(found.vCapturedWindows);
         m_vCapturedExcludedWindows.swap(found.vCapturedExcludedWindows);
         isOnOtherDisplays = m_vAppDisplays != found.vAppDisplays;

@@ -15,5 +15,5 @@ public:
 
 private:
     std::chrono::nanoseconds m_start;
-    int m_nReserved = 0;
+    [[maybe_unused]] int m_nReserved = 0;
 };

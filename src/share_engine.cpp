@@ -3,6 +3,7 @@
 #include "src/app_share_config.h"
 #include "src/share_capture_engine_impl.h"
 #include "src/share_capture_engine_kinds.h"
+#include "src/thumbnail_capture_engine.h"
 #include "util/cm_guarded_call.h"
 #include "util/cm_trace.h"
 
@@ -85,6 +86,7 @@ int ShareEngineInit() {
 }
 
 int ShareEngineUninit() {
+    CThumbnailCaptureEngine::get().stop();
     ReleaseShareLib();
     return SHARE_RESULT_OK;
 }

@@ -4,7 +4,10 @@
 #include "src/app_share_config.h"
 #include "src/mac/app_enum_mac.h"
 #include "src/mac/monitor_enum_mac.h"
+#include "src/mac/share_capturer_app_mac.h"
 #include "src/mac/share_capturer_desktop_mac.h"
+#include "src/mac/share_capturer_window_mac.h"
+#include "src/mac/share_pointing_mouse_mac.h"
 #include "src/share_capturer_dummy.h"
 #include "src/share_pointing_mouse.h"
 #include "src/share_source_dummy.h"
@@ -25,9 +28,13 @@ IShareCapturer* BuildCapturer(SHARE_CAPTURER_TYPE type,
                 return new CShareCapturerDummy(context);
             return new CShareCapturerDesktopMac(context);
         case SHARE_CAPTURER_TYPE_APP:
+            if (isDummyWanted)
+                return new CShareCapturerDummy(context);
+            return new CShareCapturerAppMac(context);
         case SHARE_CAPTURER_TYPE_WINDOW:
-            // Nothing captures single applications or windows yet.
-            return isDummyWanted ? new CShareCapturerDummy(context) : nullptr;
+            if (isDummyWanted)
+                return new CShareCapturerDummy(context);
+            return new CShareCapturerWindowMac(context);
         case SHARE_CAPTURER_TYPE_DUMMY:
             return new CShareCapturerDummy(context);
     }
@@ -52,11 +59,12 @@ IShareSourceEnumerator* BuildEnumerator(SHARE_SOURCE_ENUMERATOR_TYPE type, bool 
 ISharePointing* BuildPointing(SHARE_POINTING_TYPE type, unsigned baseDisplay) {
     if (type != SHARE_POINTING_TYPE_MOUSE)
         return nullptr;
-    // Nothing looks at a real pointer yet.
-    if (!AppShareConfig::Instance()->IsDummyPointEnabled())
-        return nullptr;
-    CmTraceDebug("CreateSharePointing() create dummy object ");
-    return new CSharePointingMouseDummy(baseDisplay);
+    if (AppShareConfig::Instance()->IsDummyPointEnabled()) {
+        CmTraceDebug("CreateSharePointing() create dummy object ");
+        return new CSharePointingMouseDummy(baseDisplay);
+    }
+    CmTraceDebug("CreateSharePointing() create object ");
+    return new CSharePointingMouseMac(baseDisplay);
 }
 
 } // namespace

@@ -1,14 +1,20 @@
 // SPDX-License-Identifier: Apache-2.0
+#include "src/thumbnail_capture_engine.h"
+
 #include <screenshare/share_engine.h>
 
-/// The exported functions of thumbnails. Nobody makes thumbnails yet, so no request is taken.
+/// The exported functions of thumbnails.
 
-int EnumAppThumbnail(const unsigned*, int, ThumbnailCallback*) {
-    return SHARE_RESULT_FAILED;
+int EnumAppThumbnail(const unsigned* pids, int count, ThumbnailCallback* callback) {
+    return CThumbnailCaptureEngine::get().requestForApps(pids, count, callback) ? SHARE_RESULT_OK
+                                                                                : SHARE_RESULT_FAILED;
 }
 
-int EnumWindowThumbnail(const unsigned*, int, ThumbnailCallback*) {
-    return SHARE_RESULT_FAILED;
+int EnumWindowThumbnail(const unsigned* windows, int count, ThumbnailCallback* callback) {
+    return CThumbnailCaptureEngine::get().requestForWindows(windows, count, callback) ? SHARE_RESULT_OK
+                                                                                      : SHARE_RESULT_FAILED;
 }
 
-void CancelThumbnail(ThumbnailCallback*) {}
+void CancelThumbnail(ThumbnailCallback* callback) {
+    CThumbnailCaptureEngine::get().cancel(callback);
+}

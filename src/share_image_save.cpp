@@ -22,6 +22,8 @@
 namespace {
 
 constexpr std::size_t BMP_HEADER_SIZE = 54;
+/// What is saved here mostly shows somebody's screen.
+constexpr unsigned OWNER_ONLY = 0600;
 
 struct CloseFile {
     void operator()(std::FILE* file) const { std::fclose(file); }
@@ -85,7 +87,7 @@ bool EncodeAndWrite(platform::CGImageRef image, platform::NSBitmapImageFileType 
     const std::vector<std::uint8_t> file = representation.representationUsingType(type, properties);
     if (file.empty())
         return false;
-    platform::writeToFile(file, path, true);
+    platform::writeToFile(file, path, true, OWNER_ONLY);
     return true;
 }
 

@@ -25,7 +25,8 @@ platform::CGImageRef RawDataToImage(unsigned char* data, int width, int height, 
 platform::CGImageRef ShareFrameToImage(IShareFrame* frame);
 
 // The rest give true as soon as there was an encoded picture to write. Whether the file could be written is
-// not looked at; a file that could not is not there, or is still what it was.
+// not looked at; a file that could not is not there, or is still what it was. Only the user may open it, and
+// a link under its name is replaced and not followed.
 
 /// `quality` from 0 to 1.
 bool SaveRawDataToJPEG(unsigned char* data, int width, int height, int lineBytes, SHARE_FRAME_FORMAT format,

@@ -1,7 +1,6 @@
 // SPDX-License-Identifier: Apache-2.0
 #pragma once
 
-#include "platform/core_types.h"
 #include "src/share_atomic.h"
 #include "util/qvn_unknown_impl.h"
 
@@ -55,7 +54,7 @@ protected:
     void _TellImage(ISharePointingImg* image);
 
     ShareRelaxed<unsigned> m_nBaseDisplayID;
-    platform::CGRect m_rcScreenBounds; // of that display
+    ShareRelaxedCGRect m_rcScreenBounds; // of that display
     std::list<ISharePointingSink*> m_listSink;
     float m_fLastX = -1.0F;
     float m_fLastY = -1.0F;

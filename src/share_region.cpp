@@ -138,6 +138,13 @@ bool TVLRegion::GetRects(std::vector<TVLRect>& rects) const noexcept {
     return false;
 }
 
+std::vector<TVLRect> TVLRegion::AllRects() const {
+    std::vector<TVLRect> rects;
+    if (!GetRects(rects) && m_hShape != nullptr)
+        throw std::bad_alloc();
+    return rects;
+}
+
 bool TVLRegion::GetRgnBox(TVLRect& box) const noexcept {
     platform::CGRect bounds;
     if (platform::HIShapeGetBounds(m_hShape.get(), &bounds) == nullptr)
@@ -176,10 +183,10 @@ bool TVLRegion::TakeCopyOf(const platform::HIShape* shape) noexcept {
 
 bool TVLRegion::ProjectRgn(const TVLRect& origin, float scale) noexcept {
     std::vector<TVLRect> rects;
-    GetRects(rects);
+    const bool isLost = !GetRects(rects) && m_hShape != nullptr;
     for (TVLRect& rect : rects)
         rect = Project(rect, origin, scale);
-    m_hShape = UnionOf(rects.data(), rects.size());
+    m_hShape = isLost ? nullptr : UnionOf(rects.data(), rects.size());
     return true;
 }
 

@@ -27,7 +27,9 @@ enum RegionCombinOpt : int {
 ///
 /// When memory runs out a region may be left without a shape, and copying such a region makes another. It
 /// counts as empty and refuses to be changed until Empty, SetRectRgn, a copy or ProjectRgn gives it a shape.
-/// Threads: one at a time. Errors: false, and the region is as it was. Nothing is traced or thrown.
+/// Threads: one at a time. Errors: false, and the region is as it was. Nothing is traced, nor thrown but
+/// where
+///          it says so.
 class TVLRegion {
 public:
     TVLRegion() noexcept;
@@ -58,6 +60,8 @@ public:
 
     /// Appends to `rects`.
     bool GetRects(std::vector<TVLRect>& rects) const noexcept;
+    /// The same on their own, none without a shape. Throws std::bad_alloc.
+    std::vector<TVLRect> AllRects() const;
 
     /// The smallest rectangle around the region, all zeros when it is empty. False without a shape, and `box`
     /// is untouched.
@@ -68,7 +72,7 @@ public:
 
     /// Maps global display coordinates into a frame whose left top corner is at that of `origin`: each edge
     /// of each rectangle is moved, scaled and cut toward zero for itself, so a thin rectangle may vanish.
-    /// Always true.
+    /// Always true; without memory there is no shape afterwards.
     bool ProjectRgn(const TVLRect& origin, float scale) noexcept;
 
     /// "{ region:{size:2,rects:[{{left:…}},\n{{left:…}},\n]}}"; not complete when memory runs out.
