@@ -243,33 +243,6 @@ bool CShareCGSCapturer::isWindowShared(unsigned window) const {
     return m_shareCapturerContext == nullptr || m_shareCapturerContext->IsWindowShared(window);
 }
 
-/// Looks a shared window's owner up once more. A verdict that was made while the window server failed took
-/// the window for nobody's, whom nobody keeps out: what can't be told now, or belongs to an application that
-/// is kept out, stays away unless the window itself is shared.
-bool CShareCGSCapturer::MayBeKeptOut(unsigned window) const {
-    platform::CGSConnectionID owner = 0;
-    pid_t pid = 0;
-    const platform::CGSConnectionID connection = platform::CGSDefaultConnection();
-    const platform::CGError error = platform::CGSGetWindowOwner(connection, window, &owner);
-    if (error == platform::kCGErrorFailure)
-        return false; // really nobody's
-    if (error == platform::kCGErrorSuccess &&
-        platform::CGSConnectionGetPID(owner, &pid) == platform::kCGErrorSuccess &&
-        !m_shareCapturerContext->IsAppUnShared(static_cast<unsigned>(pid)))
-        return false;
-    std::vector<unsigned> shared;
-    m_shareCapturerContext->GetSharedWindows(shared);
-    return std::find(shared.begin(), shared.end(), window) == shared.end();
-}
-
-/// Whether there may be something that a picture of a whole display must not show.
-bool CShareCGSCapturer::KeepsOut() const {
-    if (m_shareCapturerContext == nullptr)
-        return false;
-    return !isDesktopSharing() || m_shareCapturerContext->GetUnSharedWindowCount() > 0 ||
-           m_shareCapturerContext->GetUnSharedAppCount() > 0;
-}
-
 int CShareCGSCapturer::createShareImage(const platform::CGRect& rect, platform::CGWindowImageRef& image,
                                         platform::CGRect& outRect) {
     image = nullptr;
@@ -294,7 +267,8 @@ bool CShareCGSCapturer::getCaptureWindows(std::vector<int>& windows) {
     ShareUtilMac::GetOnScreenWindowList(windows);
     const auto isKeptOut = [this](int id) {
         const auto window = static_cast<unsigned>(id);
-        return !isWindowShared(window) || (m_shareCapturerContext != nullptr && MayBeKeptOut(window));
+        return !isWindowShared(window) ||
+               (m_shareCapturerContext != nullptr && m_shareCapturerContext->MayBeKeptOut(window));
     };
     windows.erase(std::remove_if(windows.begin(), windows.end(), isKeptOut), windows.end());
     return true;
@@ -313,7 +287,8 @@ platform::CGWindowImageRef CShareCGSCapturer::createScreenShot(const unsigned* w
         outRect = getAppRect(list, rect);
     const unsigned options =
         isDesktop ? platform::kCGWindowImageBoundsIgnoreFraming : platform::kCGWindowImageDefault;
-    return platform::CGWindowListTakeImage(outRect, list, options, KeepsOut());
+    return platform::CGWindowListTakeImage(
+        outRect, list, options, m_shareCapturerContext != nullptr && m_shareCapturerContext->KeepsOut());
 }
 
 platform::CGRect CShareCGSCapturer::getAppRect(std::span<const platform::CGWindowID> windows,

@@ -75,8 +75,6 @@ private:
     struct Pass;
 
     bool IsWindowArea() const;
-    bool MayBeKeptOut(unsigned window) const;
-    bool KeepsOut() const;
     void FitToWindows(Pass& pass);
     platform::CGRect PlaceOf(const Pass& pass) const;
     void PaintBackground(const Pass& pass);

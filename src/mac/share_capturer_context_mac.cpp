@@ -1,6 +1,7 @@
 // SPDX-License-Identifier: Apache-2.0
 #include "src/mac/share_capturer_context_mac.h"
 
+#include "platform/core_graphics.h"
 #include "platform/window_services.h"
 #include "src/app_share_config.h"
 #include "src/mac/share_util_mac.h"
@@ -55,6 +56,7 @@ struct ShareCapturerContextMac::Walk {
     platform::CGSConnectionID connection = 0;
     SHARE_TYPE shareType = SHARE_TYPE_DESKTOP;
     bool excludesMenuBars = false;
+    bool findsExposed = false;
     std::vector<unsigned> displays;
     TVLRegion rgnDisplay;
     MenuBarRule menuBars;
@@ -70,18 +72,32 @@ struct ShareCapturerContextMac::WalkedWindow {
     int winLevel = -1;
     TVLRect rcWindow{};
 
+    float Alpha(platform::CGSConnectionID connection) const {
+        float alpha = 1.0F;
+        platform::CGSGetWindowAlpha(connection, id, &alpha);
+        return alpha;
+    }
+    /// Whether anything of it is in a picture of its display.
+    bool GivesPixels() const {
+        const auto descriptions = platform::CGWindowListCreateDescriptionFromArray({&id, 1});
+        return !descriptions.empty() &&
+               descriptions.front().kCGWindowSharingState != platform::kCGWindowSharingNone;
+    }
     bool IsDock() const { return winLevel == platform::CGWindowLevelForKey(platform::kCGDockWindowLevelKey); }
 };
 
 int ShareCapturerContextMac::UpdateShareCapturerContext() {
     const unsigned flags = AppShareConfig::Instance()->m_nShareConfigFlags;
-    if ((flags & SHARE_CONFIG_FLAG_NO_WINDOW_WALK) != 0)
+    if ((flags & SHARE_CONFIG_FLAG_NO_WINDOW_WALK) != 0) {
+        m_nWalkedGeneration = 0;
         return SHARE_RESULT_OK;
+    }
     ShareDumpTimeUsage total;
     ShareDumpTimeUsage step;
     Walk walk = _BeginWalk();
     std::vector<int> windows;
     ShareUtilMac::GetOnScreenWindowList(windows);
+    const std::uint64_t generation = platform::PinnedWindowGeneration();
     CmTraceDetail("ShareCapturerContextMac::UpdateShareCapturerContext begin >> WindowsCount=",
                   windows.size());
     CmTraceDetail("UpdateShareCapturerContext init usageTime=", step.Stop());
@@ -101,6 +117,10 @@ int ShareCapturerContextMac::UpdateShareCapturerContext() {
     CmTraceDetail("UpdateShareCapturerContext reverse overlap windows usageTime=", step.Stop());
     _UniteKept(walk);
     _ClipToDisplays(walk);
+    // A pin that has run out meanwhile answered for later windows than those that were listed, and without a
+    // connection nothing was told of them.
+    const bool isOfOneMoment = walk.connection != 0 && platform::PinnedWindowGeneration() == generation;
+    m_nWalkedGeneration = walk.isWhole && isOfOneMoment ? generation : 0;
     if (!walk.isWhole)
         _ShowNothing();
     _UpdateAppsDisplay(m_paramSet);
@@ -117,6 +137,7 @@ ShareCapturerContextMac::Walk ShareCapturerContextMac::_BeginWalk() const {
     walk.connection = platform::CGSDefaultConnection();
     walk.shareType = m_eShareType;
     walk.excludesMenuBars = !walk.IsDesktop() && !m_bNoWindowBaseArea && m_bExcludeMenuBar;
+    walk.findsExposed = m_bFindsExposed;
     const Guard lock(m_displayLock);
     walk.displays = m_vSharedDisplays;
     walk.rgnDisplay.CopyRgn(m_rgnDisplay);
@@ -128,12 +149,17 @@ void ShareCapturerContextMac::_WalkWindow(Walk& walk, unsigned id) {
     window.id = id;
     window.bShared = __IsWindowShared(id);
     platform::CGSGetWindowLevel(walk.connection, id, &window.winLevel);
+    platform::CGRect frame;
     if (!walk.IsDesktop() && (window.IsDock() || ShareUtilMac::need_skip_window(id, window.winLevel))) {
         CmTraceDetail("check windows:", ",bShared=", window.bShared, ",oneWindow=", id,
                       ",winLevel=", window.winLevel, ",Skip");
+        if (walk.findsExposed &&
+            platform::CGSGetScreenRectForWindow(walk.connection, id, &frame) == platform::kCGErrorSuccess) {
+            window.rcWindow = ShareUtilMac::CGRectToTVLRect(frame);
+            _Expose(walk, window);
+        }
         return;
     }
-    platform::CGRect frame;
     platform::CGSGetScreenRectForWindow(walk.connection, id, &frame);
     window.rcWindow = ShareUtilMac::CGRectToTVLRect(frame);
 
@@ -156,19 +182,32 @@ void ShareCapturerContextMac::_KeepWindow(Walk& walk, WalkedWindow& window) {
         window.rcWindow = ShareUtilMac::CGRectToTVLRect(ShareUtilMac::GetDockBarRect(walk.displays.front()));
     walk.Need(m_paramSet.rgnVisible.AddRect(window.rcWindow));
     walk.Need(m_paramSet.rgnOverlap.ExcludeRect(window.rcWindow));
+    _CoverExposed(walk, window);
 }
 
 void ShareCapturerContextMac::_KeepOutWindow(Walk& walk, const WalkedWindow& window) {
     m_paramSet.vCapturedExcludedWindows.push_back(window.id);
+    _Expose(walk, window);
     TVLRegion hidden;
     walk.Need(hidden.AddRect(window.rcWindow));
     walk.Need(hidden.CombineRgn(m_paramSet.rgnVisible, REGION_COMBINE_AND));
     if (hidden.IsEmpty())
         return;
-    float alpha = 1.0F;
-    platform::CGSGetWindowAlpha(walk.connection, window.id, &alpha);
-    if (alpha > 0)
+    if (window.Alpha(walk.connection) > 0)
         _HideVisible(walk, hidden);
+}
+
+void ShareCapturerContextMac::_Expose(Walk& walk, const WalkedWindow& window) {
+    if (walk.findsExposed && window.Alpha(walk.connection) > 0)
+        walk.Need(m_paramSet.rgnExposed.AddRect(window.rcWindow));
+}
+
+void ShareCapturerContextMac::_CoverExposed(Walk& walk, const WalkedWindow& window) {
+    if (!walk.findsExposed || m_paramSet.rgnExposed.IsEmpty())
+        return;
+    const bool isOpaque = !walk.IsDesktop() || window.Alpha(walk.connection) >= 1.0F;
+    if (isOpaque && window.GivesPixels())
+        walk.Need(m_paramSet.rgnExposed.ExcludeRect(window.rcWindow));
 }
 
 void ShareCapturerContextMac::_HideVisible(Walk& walk, const TVLRegion& hidden) {
@@ -193,7 +232,8 @@ void ShareCapturerContextMac::_UniteKept(Walk& walk) {
 }
 
 void ShareCapturerContextMac::_ClipToDisplays(Walk& walk) {
-    for (TVLRegion* region : {&m_paramSet.rgnVisible, &m_paramSet.rgnSharedWindow, &m_paramSet.rgnOverlap})
+    for (TVLRegion* region : {&m_paramSet.rgnVisible, &m_paramSet.rgnSharedWindow, &m_paramSet.rgnOverlap,
+                              &m_paramSet.rgnExposed})
         walk.Need(region->CombineRgn(walk.rgnDisplay, REGION_COMBINE_AND));
 }
 

@@ -33,6 +33,10 @@ private:
     void _WalkWindow(Walk& walk, unsigned id);
     void _KeepWindow(Walk& walk, WalkedWindow& window);
     void _KeepOutWindow(Walk& walk, const WalkedWindow& window);
+    // What is exposed: what isn't kept, less the kept windows in front of it. In a share of a desktop a
+    // translucent window covers nothing; in one of windows it is part of what is shared, as it is seen.
+    void _Expose(Walk& walk, const WalkedWindow& window);
+    void _CoverExposed(Walk& walk, const WalkedWindow& window);
     /// Makes overlap of a part of the visible region.
     void _HideVisible(Walk& walk, const TVLRegion& hidden);
     void _HideDocks(Walk& walk);

@@ -3,7 +3,10 @@
 
 #include "platform/core_graphics.h"
 #include "src/app_share_config.h"
+#include "src/mac/avfoundation/share_capturer_mac_avfoundation.h"
+#include "src/mac/avfoundation/share_capturer_mac_avfoundation_cgs_mix.h"
 #include "src/mac/monitor_enum_mac.h"
+#include "src/mac/share_capturer_cgs_gcd.h"
 #include "src/mac/share_capturer_context_mac.h"
 #include "src/mac/share_capturer_tovel.h"
 #include "src/share_util.h"
@@ -16,13 +19,14 @@
 
 namespace {
 
-/// Null for a mode that has no back-end yet: captures fail then, and the engine falls back to the default.
 std::shared_ptr<ShareCapturerMac> MakeBackEnd(int type) {
     switch (type) {
-        case SCREEN_CAPTURER_TYPE_AVFOUNDATION_CGS_MIX:
         case SCREEN_CAPTURER_TYPE_CGS_GCD:
+            return std::make_shared<ShareCapturerCGSGCD>();
         case SCREEN_CAPTURER_TYPE_AVFOUNDATION:
-            return nullptr;
+            return std::make_shared<ShareCapturerAVFoundation>();
+        case SCREEN_CAPTURER_TYPE_AVFOUNDATION_CGS_MIX:
+            return std::make_shared<ShareCapturerAVFoundationCGSMix>();
         default:
             return std::make_shared<ShareCapturerTovel>();
     }
@@ -162,8 +166,9 @@ int CShareCapturerDesktopMac::SelectSharedDisplay(unsigned display) {
         return SHARE_RESULT_INVALID_PARAM;
     if (InitCapturer() != SHARE_RESULT_OK)
         return SHARE_RESULT_FAILED;
-    SelectSharedMonitor(display);
-    return SHARE_RESULT_OK;
+    const bool isSelected = CmCallGuarded("[CShareCapturerDesktopMac::SelectSharedDisplay]>>fail>>",
+                                          [&] { SelectSharedMonitor(display); });
+    return isSelected ? SHARE_RESULT_OK : SHARE_RESULT_FAILED;
 }
 
 int CShareCapturerDesktopMac::SelectSharedMonitor(unsigned display) {
@@ -183,8 +188,12 @@ int CShareCapturerDesktopMac::AddCaptureShareSource(IShareSource* source) {
         return SHARE_RESULT_FAILED;
     if (InitCapturer() != SHARE_RESULT_OK)
         return SHARE_RESULT_FAILED;
-    SelectSharedMonitor(static_cast<unsigned>(source->GetSourceUniqueId()));
-    return CShareCapturer::AddCaptureShareSource(source);
+    int result = SHARE_RESULT_FAILED;
+    CmCallGuarded("[CShareCapturerDesktopMac::AddCaptureShareSource]>>fail>>", [&] {
+        SelectSharedMonitor(static_cast<unsigned>(source->GetSourceUniqueId()));
+        result = CShareCapturer::AddCaptureShareSource(source);
+    });
+    return result;
 }
 
 int CShareCapturerDesktopMac::RemoveCaptureShareSource(IShareSource*) {

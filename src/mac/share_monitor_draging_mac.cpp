@@ -12,12 +12,6 @@ namespace {
 /// How long windows count as moving after their last change was seen.
 constexpr unsigned long REST_MS = 500;
 
-std::vector<TVLRect> RectsOf(const TVLRegion& region) {
-    std::vector<TVLRect> rects;
-    region.GetRects(rects);
-    return rects;
-}
-
 } // namespace
 
 ShareUtilMacMonitorDraging::ShareUtilMacMonitorDraging(const std::shared_ptr<ShareCapturerContext>& context)
@@ -56,7 +50,7 @@ bool ShareUtilMacMonitorDraging::IsVisiableRegionChanged() {
         m_rgnVisibleCache.CopyRgn(visible);
         return false;
     }
-    if (RectsOf(m_rgnVisibleCache) == RectsOf(visible))
+    if (m_rgnVisibleCache.AllRects() == visible.AllRects())
         return false;
     m_rgnVisibleCache.CopyRgn(visible);
     return true;
