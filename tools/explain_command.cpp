@@ -1,39 +1,42 @@
 // SPDX-License-Identifier: Apache-2.0
 #include "tools/explain_command.h"
 
+#include "tools/desktop_state.h"
+#include "tools/explanation_json.h"
 #include "tools/explanation_svg.h"
+#include "tools/standard_output.h"
 
-#include <cerrno>
-#include <cstdio>
-#include <cstring>
-#include <memory>
+#include <utility>
 
 namespace {
 
-struct CloseFile {
-    void operator()(std::FILE* file) const { std::fclose(file); }
-};
-
-std::string WriteProblem(const std::string& file) {
-    return "cannot write " + file + ": " + std::strerror(errno);
+WriteResult NotExplained(std::string problem) {
+    return WriteFailure{EXIT_CODE_FAILED, std::move(problem)};
 }
 
-/// Empty when all of it is written.
-std::string WriteFile(const std::string& file, const std::string& text) {
-    errno = 0;
-    std::unique_ptr<std::FILE, CloseFile> open(std::fopen(file.c_str(), "we"));
-    if (!open)
-        return WriteProblem(file);
-    // What is only buffered counts when it has been taken.
-    if (std::fwrite(text.data(), 1, text.size(), open.get()) != text.size() || std::fflush(open.get()) != 0)
-        return WriteProblem(file);
-    return std::fclose(open.release()) == 0 ? "" : WriteProblem(file);
+WriteResult WriteWholeFile(const std::string& file, const std::string& text) {
+    const StopFlag neverStopped;
+    CaptureOutput output(neverStopped);
+    if (WriteResult failure = output.Open(file))
+        return failure;
+    if (WriteResult failure = output.Write(text.data(), text.size()))
+        return failure;
+    return output.Close();
 }
 
 } // namespace
 
-std::string ExplainInto(const std::string& file, ShareRequest request) {
-    if (std::string problem = CompleteRequest(request); !problem.empty())
-        return problem;
-    return WriteFile(file, ExplanationSvg(Explain(request)));
+WriteResult ExplainInto(const std::string& file, ExplainForm form, ShareRequest request) {
+    if (std::string problem = ProblemBeforeLook(); !problem.empty())
+        return NotExplained(std::move(problem));
+    const std::string misfit = CompleteRequest(request);
+    const Explanation explanation = misfit.empty() ? Explain(request) : Explanation();
+    // What isn't there may only have gone with everything else.
+    if (std::string problem = ProblemAfterLook(); !problem.empty())
+        return NotExplained(std::move(problem));
+    if (!misfit.empty())
+        return NotExplained(misfit);
+    const std::string text =
+        form == ExplainForm::Json ? ExplanationJson(explanation) : ExplanationSvg(explanation);
+    return file.empty() || file == "-" ? PrintAnswer(text) : WriteWholeFile(file, text);
 }

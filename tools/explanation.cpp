@@ -10,10 +10,6 @@
 
 namespace {
 
-bool Contains(const std::vector<unsigned>& values, unsigned value) {
-    return std::find(values.begin(), values.end(), value) != values.end();
-}
-
 bool IsAtLevel(const platform::CGWindowDescription& window, platform::CGWindowLevelKey key) {
     return window.kCGWindowLayer == platform::CGWindowLevelForKey(key);
 }

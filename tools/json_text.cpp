@@ -20,8 +20,31 @@ JsonObjectText& JsonObjectText::Bool(std::string_view name, bool value) {
     return Add(name, value ? "true" : "false");
 }
 
+JsonObjectText& JsonObjectText::Null(std::string_view name) {
+    return Add(name, "null");
+}
+
+JsonObjectText& JsonObjectText::Object(std::string_view name, const JsonObjectText& value) {
+    return Add(name, value.Text());
+}
+
+JsonObjectText& JsonObjectText::Array(std::string_view name, std::string_view arrayText) {
+    const std::size_t end = arrayText.find_last_not_of('\n');
+    return Add(name, arrayText.substr(0, end + 1));
+}
+
 JsonObjectText& JsonObjectText::Add(std::string_view name, std::string_view valueText) {
-    m_members += (m_members.empty() ? "" : ", ") + JsonStringText(name) + ": " + std::string(valueText);
+    return Join(JsonStringText(name) + ": " + std::string(valueText));
+}
+
+JsonObjectText& JsonObjectText::MembersOf(const JsonObjectText& other) {
+    return Join(other.m_members);
+}
+
+JsonObjectText& JsonObjectText::Join(std::string_view members) {
+    if (!m_members.empty() && !members.empty())
+        m_members += ", ";
+    m_members += members;
     return *this;
 }
 

@@ -15,11 +15,19 @@ public:
     /// What is no number at all becomes null.
     JsonObjectText& Number(std::string_view name, double value);
     JsonObjectText& Bool(std::string_view name, bool value);
+    JsonObjectText& Null(std::string_view name);
+    JsonObjectText& Object(std::string_view name, const JsonObjectText& value);
+    /// What JsonArrayText gave.
+    JsonObjectText& Array(std::string_view name, std::string_view arrayText);
+    /// All members of another one.
+    JsonObjectText& MembersOf(const JsonObjectText& other);
 
+    bool operator==(const JsonObjectText&) const = default;
     std::string Text() const { return "{" + m_members + "}"; }
 
 private:
     JsonObjectText& Add(std::string_view name, std::string_view valueText);
+    JsonObjectText& Join(std::string_view members);
 
     std::string m_members;
 };
