@@ -9,7 +9,7 @@
 
 namespace {
 
-constexpr int pixelBytes = 4;
+constexpr int grabbedPixelBytes = 4;
 
 int BitsPerPixel(const xcb_setup_t* setup, std::uint8_t depth) {
     for (auto formats = xcb_setup_pixmap_formats_iterator(setup); formats.rem > 0;
@@ -36,7 +36,7 @@ const xcb_visualtype_t* FindVisual(const xcb_screen_t* screen, xcb_visualid_t id
 // A server may keep red or blue in the low byte of the pixel word, and that word in either byte order.
 std::optional<X11PixelOrder> FindPixelOrder(const xcb_setup_t* setup, const xcb_screen_t* screen) {
     const xcb_visualtype_t* visual = FindVisual(screen, screen->root_visual);
-    if (visual == nullptr || BitsPerPixel(setup, screen->root_depth) != 8 * pixelBytes ||
+    if (visual == nullptr || BitsPerPixel(setup, screen->root_depth) != 8 * grabbedPixelBytes ||
         visual->green_mask != 0x00FF00) {
         return std::nullopt;
     }
@@ -99,7 +99,8 @@ bool X11Grabber::Grab(X11Picture& picture) {
         if (!ReadSize()) {
             return false;
         }
-        const auto size = static_cast<std::size_t>(m_width) * static_cast<std::size_t>(m_height) * pixelBytes;
+        const auto size =
+            static_cast<std::size_t>(m_width) * static_cast<std::size_t>(m_height) * grabbedPixelBytes;
         if (HasMemoryFor(size) ? GrabThroughMemory(picture) : GrabThroughConnection(picture)) {
             return true;
         }
@@ -159,5 +160,5 @@ bool X11Grabber::GrabThroughConnection(X11Picture& picture) {
 }
 
 X11Picture X11Grabber::MakePicture(const std::uint8_t* pixels) const {
-    return {pixels, m_width * pixelBytes, m_width, m_height};
+    return {pixels, m_width * grabbedPixelBytes, m_width, m_height};
 }

@@ -36,7 +36,7 @@ public:
 
     bool Wait() {
         std::unique_lock<std::mutex> lock(m_mutex);
-        return m_arrived.wait_for(lock, std::chrono::seconds(10), [this] { return m_left <= 0; });
+        return m_arrived.wait_for(lock, std::chrono::seconds(30), [this] { return m_left <= 0; });
     }
 
 private:
