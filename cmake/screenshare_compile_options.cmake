@@ -36,6 +36,39 @@ if(SCREENSHARE_SANITIZE)
     add_link_options(${sanitizer_options})
 endif()
 
+# What is shipped makes flaws harder to use. Only where the optimiser runs, without which the C library can't check
+# lengths, and not under sanitizers, which look closer.
+include(CheckCXXCompilerFlag)
+set(hardening_compile_options -fstack-protector-strong -Wformat -Werror=format-security)
+if(NOT CMAKE_CXX_FLAGS MATCHES "_FORTIFY_SOURCE") # who packs it may have asked for more
+    list(APPEND hardening_compile_options -U_FORTIFY_SOURCE -D_FORTIFY_SOURCE=2)
+endif()
+foreach(option IN ITEMS -fstack-clash-protection -fcf-protection) # not on every processor
+    string(MAKE_C_IDENTIFIER "SCREENSHARE_HAS${option}" has_option)
+    check_cxx_compiler_flag(${option} ${has_option})
+    if(${has_option})
+        list(APPEND hardening_compile_options ${option})
+    endif()
+endforeach()
+set(hardening_link_options -Wl,-z,relro -Wl,-z,now -Wl,-z,noexecstack)
+
+# screenshare_harden(NAME)
+#
+# For each target that has a part in the shared library or the program.
+function(screenshare_harden NAME)
+    if(SCREENSHARE_SANITIZE OR SCREENSHARE_FUZZ)
+        return()
+    endif()
+    set(optimised "$<CONFIG:Release,RelWithDebInfo,MinSizeRel>")
+    target_compile_options(${NAME} PRIVATE "$<${optimised}:${hardening_compile_options}>")
+    get_target_property(type ${NAME} TYPE)
+    if(type STREQUAL "EXECUTABLE")
+        target_link_options(${NAME} PRIVATE "$<${optimised}:-pie;${hardening_link_options}>")
+    elseif(type STREQUAL "SHARED_LIBRARY")
+        target_link_options(${NAME} PRIVATE "$<${optimised}:${hardening_link_options}>")
+    endif()
+endfunction()
+
 if(SCREENSHARE_FUZZ)
     # Coverage feedback for the whole library; the fuzzers themselves add the driver.
     add_compile_options(-fsanitize=fuzzer-no-link)
