@@ -5,7 +5,8 @@
 # the build folder that it can be installed from, and the name of a case.
 set -uo pipefail
 here=$(dirname "$(readlink -f "${BASH_SOURCE[0]}")")
-readonly here library=$1 build=$2
+root=$(dirname "$(dirname "$here")")
+readonly here root library=$1 build=$2
 
 fail() {
     echo "FAILED: $*"
@@ -15,7 +16,14 @@ fail() {
 work=$(mktemp -d) || exit 1
 trap 'rm -rf "$work"' EXIT
 
-install_to() { cmake --install "$build" --prefix "$1" >"$work/install.log" 2>&1 || fail "install: $(cat "$work/install.log")"; }
+install_component() { # COMPONENT PREFIX
+    cmake --install "$build" --prefix "$2" --component "$1" >"$work/install.log" 2>&1 ||
+        fail "install: $(cat "$work/install.log")"
+}
+install_to() { # PREFIX
+    install_component library "$1"
+    install_component development "$1"
+}
 
 expect_three_frames() { # PROGRAM
     local said
@@ -38,6 +46,33 @@ case_pkg_config() {
     # shellcheck disable=SC2086 # the flags are words
     g++ -std=c++17 "$here/client/client.cpp" $flags -Wl,-rpath,"$work/moved/lib" -o "$work/client" || fail "g++"
     expect_three_frames "$work/client"
+}
+
+need_tools() { [[ -e $build/tools/cmake_install.cmake ]] || exit 77; }
+
+case_components() {
+    need_tools
+    local component
+    for component in library development tools; do
+        mkdir -p "$work/$component"
+        install_component $component "$work/$component"
+        (cd "$work/$component" && find . -type f -o -type l) | sed -E "s,^\./,$component ,"
+    done | sed -E 's/(\.so\.1)\.[0-9.]+$/\1.VERSION/; s/Config-[a-z]+\.cmake$/Config-TYPE.cmake/' |
+        LC_ALL=C sort >"$work/installed"
+    grep -v '^#' "$here/components.txt" | LC_ALL=C sort | diff - "$work/installed" ||
+        fail "the list (<) and what is installed (>) differ"
+}
+
+# The same trial that Debian packages undergo.
+case_trial_of_the_library() {
+    install_to "$work/prefix"
+    "$root/scripts/try_installed" "$work/prefix" library "$root/examples/minimal_client" || fail "the trial fails"
+}
+
+case_trial_of_the_tools() {
+    need_tools
+    install_component tools "$work/prefix"
+    "$root/scripts/try_installed" "$work/prefix" tools || fail "the trial fails"
 }
 
 case_shared_object_name() {

@@ -8,6 +8,7 @@
 #include <memory>
 #include <optional>
 #include <string>
+#include <vector>
 
 /// A desktop with its window server, as the conformance cases drive it. Each kind of window server brings
 /// one.
@@ -88,6 +89,8 @@ public:
     virtual bool Answer() { return false; }
     virtual bool Lose() { return false; } ///< The connection breaks.
     virtual bool FindAgain() { return false; }
+    /// Whether the same windows are there again after FindAgain. Displays and applications always are.
+    virtual bool WindowsOutliveALoss() const { return CanDoAll(); }
     virtual bool NeedPermission() { return false; } ///< Not asked for yet.
     virtual bool Grant() { return false; }          ///< Or Deny: what the user answers.
     virtual bool Deny() { return false; }
@@ -96,6 +99,11 @@ public:
 
 /// One kind of window server that the contract is checked on.
 struct ConformanceKind {
-    const char* name;
+    const char* name; ///< Letters, digits and underscores.
+    const char* word; ///< What the server calls itself.
+    /// Null where this machine lacks what it takes; the cases are then skipped.
     std::unique_ptr<ConformanceDesk> (*make)();
 };
+
+/// Those that are checked. Each program with the cases brings its own.
+std::vector<ConformanceKind> ConformanceKinds();

@@ -10,7 +10,6 @@
 #include <map>
 #include <memory>
 #include <utility>
-#include <vector>
 
 /// Where there is nothing.
 class NoneDesk final : public ConformanceDesk {
@@ -156,9 +155,4 @@ private:
 template <class Desk>
 std::unique_ptr<ConformanceDesk> MakeConformanceDesk() {
     return std::make_unique<Desk>();
-}
-
-/// All that are checked.
-inline std::vector<ConformanceKind> ConformanceKinds() {
-    return {{"none", MakeConformanceDesk<NoneDesk>}, {"simulated", MakeConformanceDesk<SimulatedDesk>}};
 }

@@ -1,10 +1,12 @@
 // SPDX-License-Identifier: Apache-2.0
 #include "tests/platform/conformance_fixture.h"
+#include "tests/support/sanitizer.h"
 #include "tests/support/test_effort.h"
 
 #include <sys/wait.h>
 #include <unistd.h>
 
+#include <algorithm>
 #include <atomic>
 #include <csignal>
 #include <filesystem>
@@ -12,6 +14,7 @@
 #include <iostream>
 #include <random>
 #include <set>
+#include <vector>
 
 /// The contract of life, notices, threads and forks.
 
@@ -126,9 +129,16 @@ TEST_P(LifeContract, TellsOfALossAndOfEveryDisplayThatIsRemovedByIt) {
     NEEDS(m_desk->Lose());
     ASSERT_TRUE(m_log->WaitFor(CNoticeLog::OfDisplay(main, DisplayRemoved)));
     ASSERT_TRUE(m_log->WaitFor(CNoticeLog::OfDisplay(*display, DisplayRemoved)));
-    EXPECT_EQ(m_log->Notices().front().kind, NoticeKind::LifeChanged) << "the loss itself comes first";
+    const std::vector<Notice> told = m_log->Notices();
+    // The end of a process that goes with the server may be noticed before.
+    const auto first = std::find_if(told.begin(), told.end(), [](const Notice& each) {
+        return each.kind != NoticeKind::ApplicationEnded;
+    });
+    ASSERT_NE(first, told.end());
+    EXPECT_EQ(first->kind, NoticeKind::LifeChanged) << "the loss itself comes first";
     EXPECT_EQ(m_log->Count(NoticeKind::LifeChanged), 1u);
-    EXPECT_EQ(m_log->Count(NoticeKind::ApplicationEnded), 0u) << "nobody has ended";
+    EXPECT_EQ(m_log->Count(CNoticeLog::OfApplication(NoticeKind::ApplicationEnded, *Application())), 0u)
+        << "it hasn't ended";
     EXPECT_TRUE(IsEmpty(Server()));
     EXPECT_NE(kept->Find(*window), nullptr) << "a snapshot that was given out has changed";
 }
@@ -156,9 +166,13 @@ TEST_P(LifeContract, ComesBackInAnotherEpochWithTheSameIds) {
     EXPECT_EQ(Server().GetLife().life, Life::Alive);
     EXPECT_GT(Server().GetLife().epoch, before.epoch);
     EXPECT_EQ(MainDisplay(), main);
-    ASSERT_TRUE(Eventually([&] { return Server().GetWindows()->Find(*window) != nullptr; }));
     EXPECT_GT(Server().GetWindows()->Generation(), generation);
     EXPECT_EQ(stream->TakeNewest(SoonEnough()).outcome, PictureOutcome::Gone) << "it is of another epoch";
+    if (!m_desk->WindowsOutliveALoss()) {
+        EXPECT_EQ(Server().GetWindows()->Find(*window), nullptr) << "the id means another window";
+        return;
+    }
+    ASSERT_TRUE(Eventually([&] { return Server().GetWindows()->Find(*window) != nullptr; }));
     EXPECT_NE(TakeWhenShown(*window, 0x00FF00), nullptr);
 }
 
@@ -166,6 +180,7 @@ TEST_P(LifeContract, TellsAfterALossWhichApplicationsHaveEndedMeanwhile) {
     const auto stays = m_desk->StartApplication("Stays");
     const auto ends = m_desk->StartApplication("Ends");
     NEEDS(stays && ends);
+    m_desk->Settle();
     Server().SetNoticeReceiver(m_log);
     NEEDS(m_desk->Lose());
     ASSERT_TRUE(m_log->WaitFor(NoticeKind::LifeChanged));
@@ -173,8 +188,10 @@ TEST_P(LifeContract, TellsAfterALossWhichApplicationsHaveEndedMeanwhile) {
     NEEDS(m_desk->FindAgain());
     ASSERT_TRUE(m_log->WaitFor(CNoticeLog::OfApplication(NoticeKind::ApplicationEnded, *ends)));
     m_desk->Settle();
-    EXPECT_EQ(m_log->Count(NoticeKind::ApplicationEnded), 1u);
-    EXPECT_EQ(m_log->Count(NoticeKind::ApplicationLaunched), 0u);
+    // The desktop's own programs may end with it and be started again.
+    EXPECT_EQ(m_log->Count(CNoticeLog::OfApplication(NoticeKind::ApplicationEnded, *ends)), 1u);
+    EXPECT_EQ(m_log->Count(CNoticeLog::OfApplication(NoticeKind::ApplicationEnded, *stays)), 0u);
+    EXPECT_EQ(m_log->Count(CNoticeLog::OfApplication(NoticeKind::ApplicationLaunched, *stays)), 0u);
 }
 
 TEST_P(LifeContract, GivesTheLastStateAndNoPicturesWhileTheDesktopDoesNotAnswer) {
@@ -206,6 +223,7 @@ TEST_P(LifeContract, TellsTheOldReceiverNothingMoreAndKeepsIt) {
     NEEDS(window);
     const auto pid = m_desk->StartApplication("Guest");
     NEEDS(pid);
+    m_desk->Settle();
     auto old = std::make_shared<CNoticeLog>();
     Server().SetNoticeReceiver(old);
     Server().SetNoticeReceiver(m_log);
@@ -300,6 +318,8 @@ TEST_P(LifeContract, IsLostForGoodInAForkedProcess) {
 }
 
 TEST_P(LifeContract, HoldsNoLockOverAForkWhateverItsOtherThreadsDo) {
+    if (SCREENSHARE_TEST_SANITIZED)
+        GTEST_SKIP() << "nobody frees the locks of a sanitizer's allocator over a fork";
     const auto window = AddWindow(FRAME, 0x00FF00);
     const CGWindowID id = window.value_or(1);
     const CGDirectDisplayID display = MainDisplay();
@@ -325,7 +345,8 @@ TEST_P(LifeContract, StandsAnyOperationOnAnyThreadWhateverTheDesktopDoes) {
     const auto window = AddWindow(FRAME, 0x00FF00);
     const CGWindowID id = window.value_or(1);
     const CGDirectDisplayID display = MainDisplay();
-    const int rounds = 300 * TestEffort();
+    // A desktop that is made of processes takes long to lose and to find.
+    const int rounds = (m_desk->WindowsOutliveALoss() ? 300 : 40) * TestEffort();
     const unsigned seed = 20250321;
     std::cout << "rounds: " << rounds << ", seed: " << seed << "\n";
     WindowServer& server = Server();

@@ -365,7 +365,7 @@ private:
 } // namespace
 
 TEST_F(Notices, RegistrationsRaceWithNoticesReplacementsAndRests) {
-    const int rounds = 500 * TestEffort();
+    const int rounds = TestRounds(500);
     const unsigned seed = std::random_device{}();
     std::cout << rounds << " rounds, seed " << seed << '\n';
 
@@ -431,7 +431,7 @@ TEST_F(Notices, RegistrationsRaceWithNoticesReplacementsAndRests) {
 }
 
 TEST_F(Notices, RegistrationsThatEndThemselvesRaceWithTheirRemoval) {
-    const int rounds = 2000 * TestEffort();
+    const int rounds = TestRounds(2000);
     std::cout << rounds << " rounds\n";
     std::atomic<int> callsOnTheDead{0};
     int endedInTheirCall = 0;

@@ -388,11 +388,31 @@ TEST_F(SimulatedWindowServers, SayWhichStackALaggingPictureMayStillShow) {
     ASSERT_NE(lagging, nullptr);
     EXPECT_EQ(lagging->generationBefore, before);
     EXPECT_EQ(lagging->generationAfter, before + 1);
+    EXPECT_EQ(Take(*stream).outcome, PictureOutcome::Nothing);
     m_clock->Advance(1ms);
-    ASSERT_TRUE(m_server->SetContent(1, SimulatedContent::Colour(1)));
     const PicturePtr settled = Take(*stream).picture;
     ASSERT_NE(settled, nullptr);
     EXPECT_EQ(settled->generationBefore, before + 1);
+    EXPECT_TRUE(settled->changed.empty());
+}
+
+TEST_F(SimulatedWindowServers, TellWhoAsksOfAStackThatCannotBeSeen) {
+    const auto stream = Open(1, 10);
+    const PicturePtr first = Take(*stream).picture;
+    ASSERT_NE(first, nullptr);
+    m_log->Clear();
+    ASSERT_TRUE(m_server->SetOwner(1, 0));
+    EXPECT_EQ(Take(*stream).outcome, PictureOutcome::Nothing) << "too early";
+    m_clock->Advance(100ms);
+    EXPECT_EQ(m_log->Count(CNoticeLog::OfStream(stream->Id())), 0u);
+    const PicturePtr next = Take(*stream).picture;
+    ASSERT_NE(next, nullptr);
+    EXPECT_TRUE(next->changed.empty());
+    EXPECT_EQ(PixelsOf(*next), PixelsOf(*first));
+    EXPECT_EQ(next->generationBefore, Generation());
+    EXPECT_EQ(next->generationAfter, Generation());
+    m_clock->Advance(100ms);
+    EXPECT_EQ(Take(*stream).outcome, PictureOutcome::Nothing);
 }
 
 TEST_F(SimulatedWindowServers, HaveOnlyThePointerModesThatTheyAreGiven) {

@@ -243,6 +243,62 @@ TEST_F(WindowServices, ForgetTheMomentOfAReplacedServer) {
     EXPECT_EQ(LevelOf(1), 55);
 }
 
+TEST_F(WindowServices, TellTheGenerationOfThePinnedMoment) {
+    EXPECT_EQ(PinnedWindowGeneration(), 0u) << "nothing is pinned yet";
+    List();
+    const std::uint64_t listed = m_server->GetWindows()->Generation();
+    ASSERT_GT(listed, 0u);
+    EXPECT_EQ(PinnedWindowGeneration(), listed);
+    m_server->SetWindows({FakeWindow(1, 500, FRAME)});
+    ASSERT_GT(m_server->GetWindows()->Generation(), listed);
+    EXPECT_EQ(PinnedWindowGeneration(), listed) << "the desktop has gone on, and the walk hasn't";
+    int count = 0;
+    CGSGetOnScreenWindowCount(CGSDefaultConnection(), 0, &count);
+    EXPECT_EQ(PinnedWindowGeneration(), listed) << "counting pins nothing";
+    List();
+    EXPECT_EQ(PinnedWindowGeneration(), m_server->GetWindows()->Generation());
+}
+
+TEST_F(WindowServices, TellNoGenerationOfAMomentThatHoldsNoMore) {
+    List();
+    m_clock->Advance(99ms);
+    EXPECT_NE(PinnedWindowGeneration(), 0u);
+    m_clock->Advance(1ms);
+    EXPECT_EQ(PinnedWindowGeneration(), 0u);
+}
+
+TEST_F(WindowServices, TellNoGenerationOnceAListCouldNotBeHad) {
+    List();
+    EXPECT_NE(PinnedWindowGeneration(), 0u);
+    int read = 0;
+    EXPECT_EQ(CGSGetOnScreenWindowList(0, 0, 0, nullptr, &read), kCGErrorInvalidConnection);
+    EXPECT_EQ(PinnedWindowGeneration(), 0u) << "what was listed before is not what is there now";
+    List();
+    EXPECT_EQ(PinnedWindowGeneration(), m_server->GetWindows()->Generation());
+}
+
+TEST_F(WindowServices, TellTheGenerationToTheThreadThatListed) {
+    List();
+    const std::uint64_t listed = PinnedWindowGeneration();
+    m_server->SetWindows({});
+    std::thread([this, listed] {
+        EXPECT_EQ(PinnedWindowGeneration(), 0u);
+        List();
+        EXPECT_EQ(PinnedWindowGeneration(), m_server->GetWindows()->Generation());
+        EXPECT_NE(PinnedWindowGeneration(), listed);
+    }).join();
+    EXPECT_EQ(PinnedWindowGeneration(), listed);
+}
+
+TEST_F(WindowServices, TellNoGenerationOfAnotherServersMoment) {
+    List();
+    const CFakeWindowServerScope next;
+    next->SetWindows({FakeWindow(1, 500, FRAME)});
+    EXPECT_EQ(PinnedWindowGeneration(), 0u);
+    List();
+    EXPECT_EQ(PinnedWindowGeneration(), next->GetWindows()->Generation());
+}
+
 TEST_F(WindowServices, LetGoOfMomentsThatAreOver) {
     m_server->SetWindows({FakeWindow(1, 500, FRAME)});
     const std::weak_ptr<const WindowSnapshot> first = m_server->GetWindows();

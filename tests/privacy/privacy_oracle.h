@@ -11,8 +11,8 @@
 /// Judges a picture that a viewer gets by the colour of its pixels alone.
 ///
 /// The scene is painted for it: kept content has red 0, as has whatever stands in for something hidden; what
-/// must not be seen is pure red. So any red at all is something of the latter, blended and scaled or not.
-/// Threads: one at a time; nothing is kept. Units: points of the desktop, pixels of the frame.
+/// must not be seen is as red as can be. So any red at all is something of the latter, blended and scaled or
+/// not. Threads: one at a time; nothing is kept. Units: points of the desktop, pixels of the frame.
 
 enum class PrivacyRole {
     Kept,

@@ -210,7 +210,7 @@ class WrongWalkPrivacy : public WalkPrivacy, public testing::WithParamInterface<
 } // namespace
 
 TEST_F(WalkPrivacy, NoSceneShowsWhatIsKeptOut) {
-    const int scenes = SCENES * TestEffort();
+    const int scenes = TestRounds(SCENES);
     PrivacyFindings all;
     int alive = 0;
     for (int i = 0; i < scenes; ++i) {

@@ -12,8 +12,12 @@ namespace {
 
 /// While set, this thread finds no memory.
 thread_local bool isMemoryGone = false;
+/// How many allocations of this thread still succeed before that is set. Below 0: all of them.
+thread_local int allocationsLeft = -1;
 
 void* Allocate(std::size_t size) noexcept {
+    if (allocationsLeft >= 0 && allocationsLeft-- == 0)
+        isMemoryGone = true;
     return isMemoryGone ? nullptr : std::malloc(size);
 }
 

@@ -23,6 +23,7 @@ private:
         config.m_nResampleScreenCaptureWidth = 1920;
         config.m_nResampleScreenCaptureHeight = 1080;
         config.m_nAppShareBackgroundColor = 0x9e9e;
+        config.m_nOverlapFillColor = 0x9e9e;
         config.m_nScreenCapturerType = 1;
         config.m_bAppDisplayByWindow = true;
         config.m_fCurrentScale = 1.0F;

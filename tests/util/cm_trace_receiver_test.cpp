@@ -1,5 +1,6 @@
 // SPDX-License-Identifier: Apache-2.0
 // Receivers that come, go and misbehave while other threads trace.
+#include "tests/support/sanitizer.h"
 #include "tests/support/test_effort.h"
 #include "tests/support/trace_log.h"
 #include "util/cm_trace.h"
@@ -321,7 +322,7 @@ void HammerReceivers(Findings& findings, int swaps, bool stopAtFirstFinding) {
 } // namespace
 
 TEST_F(CmTraceReceivers, IsNeverCalledAfterItWasTakenAway) {
-    const int swaps = 10000 * TestEffort();
+    const int swaps = TestRounds(10000);
     Findings findings;
     HammerReceivers<Door>(findings, swaps, false);
     std::cout << "swaps: " << swaps << ", calls: " << findings.calls << ", no seed\n";
@@ -336,7 +337,7 @@ TEST_F(CmTraceReceivers, IsFoundOutByTheHammerWhenItIsCalledTooLate) {
 }
 
 TEST_F(CmTraceReceivers, IsSwappedByManyThreadsAtOnce) {
-    const int swaps = 10000 * TestEffort();
+    const int swaps = TestRounds(10000);
     std::atomic<long> calls{0};
     const TracingThreads tracing(2, [] { CmTraceInfo("x"); });
     std::vector<std::thread> swapping;
@@ -382,6 +383,8 @@ int ExitCodeOf(pid_t process) {
 } // namespace
 
 TEST_F(CmTraceReceivers, WorksInAProcessForkedWhileOthersTraceAndSwap) {
+    if (SCREENSHARE_TEST_SANITIZED)
+        GTEST_SKIP() << "nobody frees the locks of a sanitizer's allocator over a fork";
     const int forks = 50 * TestEffort();
     std::cout << "forks: " << forks << ", no seed\n";
     std::atomic<long> calls{0};
