@@ -144,5 +144,11 @@ TEST(BinaryInterface, OfRecordsKeepsItsFields) {
     EXPECT_EQ(sizeof(TVLRect), 16u);
     EXPECT_EQ(sizeof(TVLSize), 8u);
     EXPECT_EQ(offsetof(ImageData, data), 16u);
+    EXPECT_EQ(offsetof(ShareWindowInfo, ownerPid), 4u);
+    EXPECT_EQ(offsetof(ShareWindowInfo, displayId), 8u);
+    EXPECT_EQ(offsetof(ShareWindowInfo, onScreen), 12u);
+    EXPECT_EQ(offsetof(ShareWindowInfo, rect), 16u);
+    EXPECT_EQ(offsetof(ShareWindowInfo, title), 32u);
+    EXPECT_EQ(sizeof(ShareWindowInfo), 544u);
     EXPECT_EQ(offsetof(IShareFrame::MetaInfo, bPointerCaptured), 16u);
 }

@@ -1,6 +1,7 @@
 // SPDX-License-Identifier: Apache-2.0
 #include "src/app_share_config.h"
 #include "src/share_capturer_dummy.h"
+#include "src/share_pointing_mouse.h"
 #include "src/share_ref.h"
 #include "src/share_source.h"
 #include "tests/support/engine_bench.h"
@@ -290,9 +291,12 @@ TEST_F(EnginesOnDummies, DeliverFramesThoughTheirPointerIsNotComposed) {
 TEST_F(EnginesOnDummies, IgnoreTheFileForTheFirstPointerAndObeyItForTheNext) {
     WriteFile(R"("dummy_point": true)");
     const CEngineProbe<CShareCaptureEngine> first;
-    EXPECT_EQ(first.m_pISharePointing, nullptr) << "made before the file was read";
+    const auto isDummy = [](ISharePointing* pointing) {
+        return dynamic_cast<CSharePointingMouseDummy*>(pointing) != nullptr;
+    };
+    EXPECT_FALSE(isDummy(first.m_pISharePointing)) << "made before the file was read";
     const CEngineProbe<CShareCaptureEngine> second;
-    EXPECT_NE(second.m_pISharePointing, nullptr);
+    EXPECT_TRUE(isDummy(second.m_pISharePointing));
 }
 
 // ---- The debug file while engines come and run

@@ -36,6 +36,7 @@ protected:
         m_debugFolder = folder;
         m_folder = m_debugFolder / "img-dump";
         fs::create_directory(m_folder);
+        fs::permissions(m_folder, fs::perms::owner_all); // whatever the umask
     }
 
     /// An engine that has read these settings, with a capturer whose pictures can be saved.
@@ -285,6 +286,18 @@ TEST_F(PointerDump, CostsAPassNothingWhenThePointerHasNoPicture) {
     EXPECT_EQ(Files(), Names{});
     EXPECT_EQ(bench.sink.FrameCount(), 1u);
     EXPECT_FALSE(bench.trace.Contains("ERROR"));
+}
+
+TEST_F(PointerDump, IsNotMadeInAFolderThatOthersMayWrite) {
+    CEngineBench<>& bench = MakeEngine(R"({"dump_point_raw_data": true, "dump_raw_data_every_x_frames": 1})");
+    const Held<> arrow = Arrow();
+    GivePointer(arrow.get(), 3, 5, 100, 50);
+    fs::permissions(m_folder, fs::perms::owner_all | fs::perms::group_all);
+    bench.Pass(BOTH);
+    EXPECT_EQ(Files(), Names{});
+    fs::permissions(m_folder, fs::perms::owner_all);
+    bench.Pass(BOTH);
+    EXPECT_EQ(Files(), Names{"1_point_97_45_hot_3_5.png"});
 }
 
 TEST_F(PointerDump, CostsAPassNothingWithoutItsFolder) {

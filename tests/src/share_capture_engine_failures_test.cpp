@@ -107,7 +107,16 @@ TEST_F(FailureWindow, StartsAfreshWhenTheDragHadBegunBeforeTheFailures) {
     bench.engine->m_tickDragStart = ShareTickNow() - 500u;
     ResultAfter(100, SHARE_CAPTURE_FAILED);
     EXPECT_FALSE(IsWindowOpen());
+    EXPECT_FALSE(HasFallenBack()) << "which would have closed it, too";
     EXPECT_EQ(bench.engine->m_tickDragStart, 0u);
+}
+
+TEST_F(FailureWindow, StaysOpenWhenTheDragBeganWithTheFailures) {
+    ResultAfter(10000, SHARE_CAPTURE_FAILED);
+    ResultAfter(0, SHARE_CAPTURE_DRAGGING);
+    ResultAfter(100, SHARE_CAPTURE_FAILED);
+    EXPECT_TRUE(IsWindowOpen());
+    EXPECT_EQ(bench.engine->m_nFailureCount, 2);
 }
 
 TEST_F(FailureWindow, KeepsTheFirstTickOfADrag) {

@@ -330,6 +330,15 @@ TEST(SharePosition, IsToldWithWidthAndHeightWhenItChanges) {
     EXPECT_EQ(bench.sink.CountNotices("position 5,6 70x80"), 1u);
 }
 
+TEST(SharePosition, IsNotToldWithoutACapturer) {
+    CEngineBench<> bench;
+    EXPECT_EQ(bench.engine->SetExternalIShareCapturer(nullptr), 0);
+    bench.BeginInline();
+    bench.engine->OnCapturedDisplaySizedChanged({70, 80});
+    bench.SettleEvents();
+    EXPECT_EQ(bench.sink.Notices(), std::vector<std::string>{"size 70x80"});
+}
+
 TEST(ShareCaptureSize, TellsThePointingObjectTheDisplay) {
     CEngineBench<> bench(true);
     bench.capturer.Change([](CFakeCapturer::Answers& answers) {

@@ -8,9 +8,11 @@
 #include <unistd.h>
 
 #include <cstddef>
+#include <cstdint>
 #include <map>
 #include <string>
 #include <thread>
+#include <utility>
 #include <vector>
 
 /// The lists, the settings and the copies that the context gives.
@@ -164,6 +166,26 @@ TEST_P(ShareCapturerContextList, SaysThatAnAbsentValueIsNotThere) {
     EXPECT_EQ(trace.Lines(), Lines{});
 }
 
+TEST_P(ShareCapturerContextList, CountsEachChangeOfWhatMayBeSeenOnce) {
+    const bool addingAdmits = GetParam() % 2 == 0;
+    using Counts = std::pair<std::uint64_t, std::uint64_t>;
+    const auto counts = [&] {
+        const Counts found{context.Admissions(), context.Withdrawals()};
+        return addingAdmits ? found : Counts{found.second, found.first};
+    };
+    Add(7);
+    EXPECT_EQ(counts(), Counts(1, 0));
+    Add(7);
+    EXPECT_EQ(counts(), Counts(1, 0)) << "it is there already";
+    Remove(7);
+    EXPECT_EQ(counts(), Counts(1, 1));
+    Remove(7);
+    EXPECT_EQ(counts(), Counts(1, 1)) << "it is gone already";
+    AddToOpposite(7);
+    Add(7);
+    EXPECT_EQ(counts(), Counts(2, 2));
+}
+
 TEST_P(ShareCapturerContextList, HoldsNoLockWhileItTraces) {
     struct Seen {
         CContextProbe& context;
@@ -269,6 +291,19 @@ TEST(ShareCapturerContext, LeavesTheDisplaysAloneWhenNoneComesOrGoes) {
     EXPECT_EQ(context.initDisplaysCalls, 1);
     EXPECT_EQ(trace.Lines(), Lines{});
     EXPECT_EQ(Got(context, &ShareCapturerContext::GetSharedMonitors), Values{5});
+}
+
+TEST(ShareCapturerContext, CountsEachDisplayThatGoesAsAWithdrawal) {
+    CContextProbe context;
+    context.AddSharedDisplay(5);
+    EXPECT_EQ(context.Withdrawals(), 0u);
+    context.RemoveSharedDisplay(5);
+    EXPECT_EQ(context.Withdrawals(), 1u);
+    context.RemoveSharedDisplay(5);
+    EXPECT_EQ(context.Withdrawals(), 1u) << "it is gone already";
+    context.ClearSharedDisplay();
+    EXPECT_EQ(context.Withdrawals(), 2u);
+    EXPECT_EQ(context.Admissions(), 0u);
 }
 
 TEST(ShareCapturerContext, RefusesTheDisplayThatIsNone) {

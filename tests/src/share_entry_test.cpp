@@ -3,18 +3,26 @@
 #include "src/app_share_config.h"
 #include "src/mac/app_enum_mac.h"
 #include "src/mac/monitor_enum_mac.h"
+#include "src/mac/share_pointing_mouse_mac.h"
 #include "src/share_capturer_context.h"
 #include "src/share_capturer_dummy.h"
 #include "src/share_pointing_mouse.h"
 #include "src/share_source_dummy.h"
+#include "src/thumbnail_capture_engine.h"
+#include "tests/src/mac/backend_tools.h"
+#include "tests/src/thumbnail_tools.h"
 #include "tests/support/call_on_thread.h"
 #include "tests/support/engine_bench.h"
 #include "tests/support/fake_window_server.h"
+#include "tests/support/sanitizer.h"
 
 #include <screenshare/share_engine.h>
 
 #include <gtest/gtest.h>
+#include <sys/wait.h>
+#include <unistd.h>
 
+#include <cstddef>
 #include <memory>
 #include <string>
 #include <typeinfo>
@@ -74,9 +82,10 @@ TEST_F(Entry, CountsItsClientAmongTheHoldersOfTheLibrary) {
     EXPECT_EQ(ShareEngineInit(), 0);
     EXPECT_EQ(ShareEngineInit(), 0);
     EXPECT_EQ(ShareEngineUninit(), 0);
-    EXPECT_EQ(trace.Lines(), Lines{Info("InitShareLib")});
+    const std::string stop = Info("CThumbnailCaptureEngine::stop");
+    EXPECT_EQ(trace.Lines(), (Lines{Info("InitShareLib"), stop}));
     EXPECT_EQ(ShareEngineUninit(), 0);
-    EXPECT_EQ(trace.Lines(), (Lines{Info("InitShareLib"), Info("UninitShareLib")}));
+    EXPECT_EQ(trace.Lines(), (Lines{Info("InitShareLib"), stop, stop, Info("UninitShareLib")}));
 }
 
 TEST_F(Entry, RestsThePlatformWithTheLastHolderAndWithoutATrace) {
@@ -111,7 +120,8 @@ TEST_F(Entry, IsFreeForAnotherHolderWhileThePlatformComesToRest) {
     const CTraceLog trace;
     ShareEngineInit();
     ShareEngineUninit();
-    EXPECT_EQ(trace.Lines(), (Lines{Info("InitShareLib"), Info("UninitShareLib"), Info("InitShareLib")}));
+    EXPECT_EQ(trace.Lines(), (Lines{Info("InitShareLib"), Info("CThumbnailCaptureEngine::stop"),
+                                    Info("UninitShareLib"), Info("InitShareLib")}));
     server->RaiseDisplayChanged(1, platform::kCGDisplayMovedFlag);
     EXPECT_TRUE(heard.Reaches(1)) << "the new holder's notices don't arrive";
     EXPECT_EQ(platform::CGDisplayRemoveReconfigurationCallback(hear, &heard), 0);
@@ -237,6 +247,15 @@ TEST_F(Entry, BuildsADummyPointingObjectWhenItIsWanted) {
     EXPECT_EQ(trace.Lines().back(), Info("DestroySharePointing(" + name + ")"));
 }
 
+TEST_F(Entry, BuildsThePointingObjectOfThePlatformWhenNoDummyIsWanted) {
+    const CTraceLog trace;
+    ISharePointing* const pointing = CreateSharePointing(SHARE_POINTING_TYPE_MOUSE, 7);
+    EXPECT_TRUE(IsA<CSharePointingMouseMac>(pointing));
+    EXPECT_EQ(trace.Lines(),
+              (Lines{Debug("CreateSharePointing(1, 7)"), Debug("CreateSharePointing() create object ")}));
+    EXPECT_EQ(DestroySharePointing(pointing), 0);
+}
+
 TEST_F(Entry, BuildsNoPointingObjectForANumberThatIsNoKind) {
     Config().m_bDummyPoint = true;
     const CTraceLog trace;
@@ -281,9 +300,111 @@ TEST_F(Entry, DoesNotSupportEncoding) {
 
 // ---- Thumbnails
 
-TEST_F(Entry, TakesNoRequestForThumbnailsWhileNobodyMakesThem) {
+namespace {
+
+/// A window of 20x10 and an application that has it.
+platform::Scene DeskWithAWindow() {
+    return platform::Scene().Display(0, 0, 100, 100).App(5'000'100, "Editor").Window(3).At(0, 0, 20, 10);
+}
+
+} // namespace
+
+TEST_F(Entry, TakesRequestsForThumbnailsAndAnswersThem) {
+    const CServedScene desk(DeskWithAWindow());
+    const unsigned windows[] = {3, 4};
+    const unsigned pid = 5'000'100;
+    CThumbnailLog log;
+    EXPECT_EQ(EnumWindowThumbnail(windows, 2, &log), 0);
+    ASSERT_TRUE(log.lasts.Reaches(1));
+    EXPECT_EQ(EnumAppThumbnail(&pid, 1, &log), 0);
+    ASSERT_TRUE(log.lasts.Reaches(2));
+    EXPECT_EQ(EnumAppThumbnail(nullptr, 0, &log), 0);
+    ASSERT_TRUE(log.lasts.Reaches(3));
+    EXPECT_EQ(log.Calls(), (ThumbnailCalls{"window 3 20x10", "window 4 failed last", "app 5000100 20x10 last",
+                                           "app 5000100 20x10 last"}));
+    CancelThumbnail(&log);
+}
+
+TEST_F(Entry, RefusesARequestForThumbnailsThatNobodyHears) {
     const unsigned id = 1;
+    CThumbnailLog log;
     EXPECT_EQ(EnumAppThumbnail(&id, 1, nullptr), -1);
     EXPECT_EQ(EnumWindowThumbnail(&id, 1, nullptr), -1);
+    EXPECT_EQ(EnumWindowThumbnail(nullptr, 0, &log), -1);
+    EXPECT_EQ(EnumAppThumbnail(&id, -1, &log), -1);
     CancelThumbnail(nullptr);
+}
+
+TEST_F(Entry, CancelsThumbnailsFromInsideTheirCallback) {
+    const CServedScene desk(DeskWithAWindow());
+    const unsigned windows[] = {3, 3, 3};
+    CThumbnailLog log([&log](std::size_t) {
+        CancelThumbnail(&log);
+        return true;
+    });
+    const CTraceLog trace;
+    EXPECT_EQ(EnumWindowThumbnail(windows, 3, &log), 0);
+    ASSERT_TRUE(trace.WaitUntilContains("thread exit"));
+    EXPECT_EQ(log.Calls(), ThumbnailCalls{"window 3 20x10"});
+}
+
+TEST_F(Entry, EndsThumbnailsForGoodWithAnyClientThatLeaves) {
+    const CServedScene desk(DeskWithAWindow());
+    const unsigned window = 3;
+    CThumbnailLog log;
+    ShareEngineInit();
+    ShareEngineInit();
+    EXPECT_EQ(EnumWindowThumbnail(&window, 1, &log), 0);
+    ASSERT_TRUE(log.lasts.Reaches(1));
+    ShareEngineUninit(); // not the last one
+    EXPECT_EQ(EnumWindowThumbnail(&window, 1, &log), -1);
+    EXPECT_EQ(EnumAppThumbnail(nullptr, 0, &log), -1);
+    ShareEngineUninit();
+    ShareEngineInit();
+    EXPECT_EQ(EnumWindowThumbnail(&window, 1, &log), -1);
+    ShareEngineUninit();
+    EXPECT_EQ(log.lasts.Count(), 1);
+}
+
+TEST_F(Entry, LeavesTheLibraryFromInsideAThumbnailsCallback) {
+    const CServedScene desk(DeskWithAWindow());
+    const unsigned windows[] = {3, 3, 3};
+    ShareEngineInit();
+    CThumbnailLog log([](std::size_t) { return ShareEngineUninit() == 0; });
+    const CTraceLog trace;
+    EXPECT_EQ(EnumWindowThumbnail(windows, 3, &log), 0);
+    ASSERT_TRUE(trace.WaitUntilContains("thread exit"));
+    EXPECT_EQ(log.Calls(), ThumbnailCalls{"window 3 20x10"});
+    EXPECT_TRUE(trace.Contains("UninitShareLib"));
+}
+
+TEST_F(Entry, MakesThumbnailsInAForkedChildWhateverTheWorkerIsAt) {
+    if (SCREENSHARE_TEST_SANITIZED)
+        GTEST_SKIP() << "a sanitizer starts no threads in a child of a process with several";
+    const unsigned window = 3;
+    CTally entered;
+    CGate gate;
+    CThumbnailLog log([&](std::size_t) {
+        entered.Add();
+        return gate.Passes();
+    });
+    const CServedScene desk(DeskWithAWindow());
+    ASSERT_EQ(EnumWindowThumbnail(&window, 1, &log), 0);
+    ASSERT_TRUE(entered.Reaches(1)); // the worker holds the engine's mutex now
+    const pid_t child = fork();
+    if (child == 0) {
+        alarm(30);
+        const CServedScene childsDesk(DeskWithAWindow());
+        CThumbnailLog childsLog;
+        const bool isTaken = EnumWindowThumbnail(&window, 1, &childsLog) == 0;
+        const bool isTold = isTaken && childsLog.lasts.Reaches(1);
+        CancelThumbnail(&childsLog);
+        CThumbnailCaptureEngine::get().stop();
+        _exit(isTold ? 0 : 1);
+    }
+    int status = -1;
+    EXPECT_EQ(waitpid(child, &status, 0), child);
+    EXPECT_EQ(status, 0);
+    gate.Open();
+    EXPECT_TRUE(log.lasts.Reaches(1));
 }

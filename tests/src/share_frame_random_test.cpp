@@ -346,7 +346,7 @@ std::string FirstDisagreement(std::uint64_t seed, Happened& happened) {
 }
 
 TEST(ShareFrameRandom, DoesAsItsModelDoes) {
-    const int runs = 1000 * TestEffort();
+    const int runs = TestRounds(1000);
     std::printf("%d sequences of %d steps from seed %llu\n", runs, STEPS,
                 static_cast<unsigned long long>(FIRST_SEED));
     Happened happened;

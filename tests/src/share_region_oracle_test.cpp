@@ -355,7 +355,7 @@ Outcome RunSequences(int sequences) {
 }
 
 TEST(TVLRegionOracle, AgreesWithASetOfPixelsAndKeepsTheLawsOfSets) {
-    const int sequences = kSequences * TestEffort();
+    const int sequences = TestRounds(kSequences);
     std::printf("%d sequences of %d steps, seeds from %u\n", sequences, kStepsInASequence, kFirstSeed);
     const Outcome outcome = RunSequences<TVLRegion>(sequences);
     EXPECT_EQ(outcome.disagreement, "");

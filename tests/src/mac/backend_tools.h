@@ -49,10 +49,12 @@ inline std::ostream& operator<<(std::ostream& out, const FramePixel& pixel) {
 inline FramePixel PixelAt(IShareFrame& frame, int x, int y) {
     TVLSize size{};
     frame.GetFrameSize(size);
+    const SHARE_FRAME_FORMAT format = frame.GetFrameDataFormat();
     if (x < 0 || y < 0 || x >= size.cx || y >= size.cy || frame.GetFrameData() == nullptr ||
-        frame.GetFrameDataFormat() != SHARE_FRAME_FORMAT_RGBA)
+        (format != SHARE_FRAME_FORMAT_RGBA && format != SHARE_FRAME_FORMAT_ARGB))
         return {};
-    const unsigned char* const at = frame.GetFrameLineData(y) + static_cast<std::ptrdiff_t>(x) * 4;
+    const unsigned char* const at = frame.GetFrameLineData(y) + static_cast<std::ptrdiff_t>(x) * 4 +
+                                    (format == SHARE_FRAME_FORMAT_ARGB ? 1 : 0);
     return {static_cast<std::uint32_t>(at[0]) << 16 | static_cast<std::uint32_t>(at[1]) << 8 | at[2]};
 }
 
@@ -79,7 +81,7 @@ inline int CountOf(IShareFrame& frame, std::uint32_t rgb) {
 
 using FrameRef = ShareRef<IShareFrame>;
 
-inline FrameRef NewFrame() {
+inline FrameRef NewFrameRef() {
     return FrameRef(new CShareFrame);
 }
 

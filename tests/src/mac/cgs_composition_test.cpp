@@ -72,7 +72,7 @@ protected:
     CServedScene desktop{Desk()};
     std::shared_ptr<ShareCapturerContext> context = std::make_shared<ShareCapturerContextMac>();
     CShareCGSCapturer capturer{context};
-    FrameRef frame = NewFrame();
+    FrameRef frame = NewFrameRef();
 };
 
 struct Sizes {
@@ -276,7 +276,7 @@ TEST_F(Composition, PaintsNothingAndKeepsNothingInMemoryThatIsTooShort) {
 TEST_F(Composition, FollowsTheFrameToAnotherMemoryAndSize) {
     EXPECT_EQ(Capture(), 0);
     const FrameRef first = frame;
-    frame = NewFrame();
+    frame = NewFrameRef();
     context->AddUnSharedWindow(3);
     EXPECT_EQ(Capture({50, 30}), 0);
     EXPECT_EQ(CountOf(*frame.Get(), GREEN), 20 * 10);

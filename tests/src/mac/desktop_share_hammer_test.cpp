@@ -1,7 +1,8 @@
 // SPDX-License-Identifier: Apache-2.0
+#include "src/mac/share_capturer_app_mac.h"
 #include "src/mac/share_capturer_context_mac.h"
-#include "src/mac/share_capturer_desktop_mac.h"
-#include "tests/src/mac/backend_tools.h"
+#include "src/mac/share_capturer_window_mac.h"
+#include "tests/src/mac/busy_desk.h"
 #include "tests/support/test_effort.h"
 #include "tests/support/threads.h"
 
@@ -9,122 +10,49 @@
 
 #include <atomic>
 #include <iostream>
-#include <random>
 #include <thread>
 
-// A desktop that never rests while it is captured. What is kept out is pure red and nothing else has any red:
-// a red pixel, blended or scaled, is a leak.
+// Captures of each kind from a desktop that never rests.
 
 using namespace platform;
+using namespace busy_desk;
 
 namespace {
 
-constexpr pid_t KEPT = 5'000'100;
-constexpr pid_t HIDDEN = 5'000'200;
-constexpr unsigned MAIN = 1;
-constexpr unsigned SIDE = 2;
-constexpr int WINDOWS = 9; // one in three is hidden
-
-bool IsHidden(CGWindowID window) {
-    return window % 3 == 0;
+std::unique_ptr<CShareCapturerDesktopMac> OfADesktop(const std::shared_ptr<ShareCapturerContext>& context) {
+    auto capturer = std::make_unique<CShareCapturerDesktopMac>(context);
+    capturer->AddUnSharedProcess(static_cast<unsigned>(HIDDEN));
+    capturer->SelectSharedDisplay(MAIN);
+    return capturer;
 }
 
-Scene BusyDesk() {
-    Scene scene;
-    scene.Display(0, 0, 120, 80).Display(120, 0, 90, 70).Scale(2);
-    scene.App(KEPT, "Kept").App(HIDDEN, "Hidden");
-    for (CGWindowID id = 1; id <= WINDOWS; ++id) {
-        scene.Window(id)
-            .Of(IsHidden(id) ? HIDDEN : KEPT)
-            .At(static_cast<float>(id * 9), static_cast<float>(id * 5), 60, 40)
-            .Colour(IsHidden(id) ? 0xFF0000 : 0x0000FF - id * 16)
-            .Alpha(id % 4 == 0 ? 0.5F : 1.0F);
-    }
-    // Of a kept application, but its pixels are never given out.
-    scene.Window(WINDOWS + 1).Of(KEPT).At(20, 20, 30, 30).Colour(0xFF0000).Unshared();
-    return scene.Pointer(30, 30).Cursor(SquareCursor(0x00FF00));
+std::unique_ptr<CShareCapturerDesktopMac> OfAnApplication(
+    const std::shared_ptr<ShareCapturerContext>& context) {
+    auto capturer = std::make_unique<CShareCapturerAppMac>(context);
+    capturer->AddSharedProcess(static_cast<unsigned>(KEPT));
+    return capturer;
 }
 
-/// Changes something at each step.
-class CUnrest {
-public:
-    CUnrest(SimulatedWindowServer& desktop, unsigned seed) : m_desktop(desktop), m_random(seed) {}
-
-    void Step() {
-        const auto window = static_cast<CGWindowID>(Between(1, WINDOWS));
-        const CGPoint place{static_cast<float>(Between(-20, 180)), static_cast<float>(Between(-20, 70))};
-        switch (Between(0, 8)) {
-            case 0:
-                m_desktop.RaiseWindow(window);
-                break;
-            case 1:
-                m_desktop.LowerWindow(window);
-                break;
-            case 2:
-                m_desktop.SetOnScreen(window, Between(0, 1) == 1);
-                break;
-            case 3:
-                m_desktop.ResizeDisplay(SIDE, {static_cast<float>(Between(40, 90)), 70});
-                break;
-            case 4:
-                m_desktop.ScaleDisplay(MAIN, Between(0, 1) == 1 ? 2.0F : 1.0F);
-                break;
-            case 5:
-                PlugSide();
-                break;
-            case 6:
-                m_desktop.SetPointer(place);
-                break;
-            default:
-                m_desktop.MoveWindow(window, place);
-        }
+std::unique_ptr<CShareCapturerDesktopMac> OfWindows(const std::shared_ptr<ShareCapturerContext>& context) {
+    auto capturer = std::make_unique<CShareCapturerWindowMac>(context);
+    for (CGWindowID window = 1; window <= WINDOWS + 1; ++window) {
+        if (!IsHidden(window))
+            capturer->AddSharedWindow(window);
     }
-
-private:
-    void PlugSide() {
-        if (m_desktop.RemoveDisplay(SIDE))
-            return;
-        SimulatedDisplay side;
-        side.id = SIDE;
-        side.bounds = {{120, 0}, {90, 70}};
-        m_desktop.AddDisplay(side);
-    }
-    int Between(int low, int high) { return std::uniform_int_distribution<int>(low, high)(m_random); }
-
-    SimulatedWindowServer& m_desktop;
-    std::mt19937 m_random;
-};
-
-struct Seen {
-    int frames = 0;
-    long leaks = 0;
-    long kept = 0; ///< Pixels of kept windows: the share was alive.
-};
-
-void LookAt(IShareFrame& frame, Seen& seen) {
-    const TVLSize size = SizeOf(frame);
-    ++seen.frames;
-    for (int y = 0; y < size.cy; ++y) {
-        const unsigned char* const row = frame.GetFrameLineData(y);
-        for (int x = 0; x < size.cx; ++x) {
-            seen.leaks += row[x * 4] != 0 ? 1 : 0;
-            seen.kept += row[x * 4 + 2] != 0 ? 1 : 0;
-        }
-    }
+    return capturer;
 }
+
+using MakeCapturer = decltype(&OfADesktop);
 
 /// Captures a desktop again and again while another thread changes it.
-Seen CaptureThroughUnrest(SimulatedLie* lie, int captures) {
+Seen CaptureThroughUnrest(MakeCapturer make, const SimulatedLie* lie, int captures) {
     constexpr unsigned SEED = 4711;
     CManualClockScope clock;
     const CSettingsScope settings;
     const CServedScene desktop(BusyDesk());
     if (lie != nullptr)
         desktop->Lie(*lie);
-    const auto context = std::make_shared<ShareCapturerContextMac>();
-    CShareCapturerDesktopMac capturer(context);
-    capturer.AddUnSharedProcess(static_cast<unsigned>(HIDDEN));
-    capturer.SelectSharedDisplay(MAIN);
+    const auto capturer = make(std::make_shared<ShareCapturerContextMac>());
 
     std::atomic<bool> isOver{false};
     std::thread other([&] {
@@ -133,13 +61,13 @@ Seen CaptureThroughUnrest(SimulatedLie* lie, int captures) {
             unrest.Step();
     });
     Seen seen;
-    const FrameRef frame = NewFrame();
+    const FrameRef frame = NewFrameRef();
     for (int i = 0; i < captures; ++i) {
         clock->Advance(std::chrono::milliseconds(501)); // whatever has moved is at rest by now
-        capturer.SetCaptureMaxSize(i % 7 == 0 ? TVLSize{77, 55} : TVLSize{1920, 1080});
+        capturer->SetCaptureMaxSize(i % 7 == 0 ? TVLSize{77, 55} : TVLSize{1920, 1080});
         if (i % 50 == 0)
-            capturer.SelectSharedDisplay(i % 100 == 0 ? SIDE : MAIN);
-        if (capturer.Capture(frame.Get()) == SHARE_CAPTURE_OK)
+            capturer->SelectSharedDisplay(i % 100 == 0 ? SIDE : MAIN);
+        if (capturer->Capture(frame.Get()) == SHARE_CAPTURE_OK)
             LookAt(*frame.Get(), seen);
     }
     isOver = true;
@@ -148,16 +76,37 @@ Seen CaptureThroughUnrest(SimulatedLie* lie, int captures) {
     return seen;
 }
 
-} // namespace
-
-TEST(DesktopShareHammer, ShowsNothingThatIsKeptOutOfADesktopThatNeverRests) {
-    const Seen seen = CaptureThroughUnrest(nullptr, 600 * TestEffort());
+void ExpectAliveWithoutLeaks(const Seen& seen) {
     EXPECT_EQ(seen.leaks, 0);
     EXPECT_GT(seen.frames, 20);
     EXPECT_GT(seen.kept, 10000);
 }
 
+} // namespace
+
+TEST(DesktopShareHammer, ShowsNothingThatIsKeptOutOfADesktopThatNeverRests) {
+    ExpectAliveWithoutLeaks(CaptureThroughUnrest(OfADesktop, nullptr, 600 * TestEffort()));
+}
+
 TEST(DesktopShareHammer, SeesTheLeakOfAServerThatGivesOutWhatIsUnshared) {
-    SimulatedLie lie = SimulatedLie::UnsharedShown;
-    EXPECT_GT(CaptureThroughUnrest(&lie, 200).leaks, 0);
+    const SimulatedLie lie = SimulatedLie::UnsharedShown;
+    EXPECT_GT(CaptureThroughUnrest(OfADesktop, &lie, 200).leaks, 0);
+}
+
+TEST(ApplicationShareHammer, ShowsNothingOfOtherApplications) {
+    ExpectAliveWithoutLeaks(CaptureThroughUnrest(OfAnApplication, nullptr, 600 * TestEffort()));
+}
+
+TEST(ApplicationShareHammer, SeesTheLeakOfAServerThatGivesOutWhatIsUnshared) {
+    const SimulatedLie lie = SimulatedLie::UnsharedShown;
+    EXPECT_GT(CaptureThroughUnrest(OfAnApplication, &lie, 200).leaks, 0);
+}
+
+TEST(WindowShareHammer, ShowsNothingOfOtherWindows) {
+    ExpectAliveWithoutLeaks(CaptureThroughUnrest(OfWindows, nullptr, 600 * TestEffort()));
+}
+
+TEST(WindowShareHammer, SeesTheLeakOfAServerThatGivesOutWhatIsUnshared) {
+    const SimulatedLie lie = SimulatedLie::UnsharedShown;
+    EXPECT_GT(CaptureThroughUnrest(OfWindows, &lie, 200).leaks, 0);
 }

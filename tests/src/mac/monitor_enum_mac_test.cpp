@@ -4,11 +4,15 @@
 #include "tests/src/mac/monitor_enum_mac_tools.h"
 #include "tests/src/share_source_tools.h"
 #include "tests/support/trace_log.h"
+#include "util/cm_trace.h"
 
 #include <gtest/gtest.h>
 
+#include <cstddef>
 #include <optional>
 #include <string>
+#include <string_view>
+#include <vector>
 
 namespace {
 
@@ -32,6 +36,25 @@ TEST_F(MonitorEnumMac, ListsTheOnlineDisplaysInTheirOrder) {
                                     DebugLine("[CShareSource::SetInfo]>>sourceId=7"),
                                     DebugLine("[CMonitorEnumMac::EnumMonitors] count=2")}));
     EXPECT_EQ(IdsOf(monitors), (Ids{kMain, kSide}));
+}
+
+TEST_F(MonitorEnumMac, ListsNoMonitorBeforeItIsKnownWhatItIs) {
+    struct Seen {
+        CMonitorEnumMac monitors{false};
+        std::vector<int> listed;
+    } seen;
+    const CTraceLog threshold(CM_TRACE_DEBUG);
+    CmSetTraceReceiver(
+        [](void* to, int, const char*, const char* text, int length) {
+            auto& into = *static_cast<Seen*>(to);
+            const std::string_view line(text, static_cast<std::size_t>(length));
+            if (line.find("[CShareSource::SetInfo]") != std::string_view::npos)
+                into.listed.push_back(NumberOf(into.monitors));
+        },
+        &seen);
+    seen.monitors.Refresh();
+    CmSetTraceReceiver(nullptr, nullptr);
+    EXPECT_EQ(seen.listed, (std::vector<int>{0, 1}));
 }
 
 TEST_F(MonitorEnumMac, GivesAMonitorItsPlaceAndScale) {

@@ -5,6 +5,7 @@
 #include "src/mac/share_capturer_context_mac.h"
 #include "src/share_source.h"
 #include "tests/src/mac/backend_tools.h"
+#include "tests/src/mac/no_back_end.h"
 #include "tests/support/engine_bench.h"
 
 #include <screenshare/share_engine.h>
@@ -102,7 +103,7 @@ protected:
     std::shared_ptr<ShareCapturerContext> context = std::make_shared<ShareCapturerContextMac>();
     CShareCapturerDesktopMac capturer{context};
     CSinkLog sink;
-    FrameRef frame = NewFrame();
+    FrameRef frame = NewFrameRef();
 };
 
 constexpr unsigned ADDED = kCGDisplayAddFlag;
@@ -142,8 +143,30 @@ TEST_F(DesktopCapturer, TakesTheDefaultBackEndForEveryTypeThatIsNone) {
     }
 }
 
+TEST_F(DesktopCapturer, TakesTheQueuedBackEndInItsMode) {
+    settings->m_nScreenCapturerType = 8;
+    const CTraceLog trace;
+    CShareCapturerDesktopMac other(context);
+    EXPECT_EQ(other.Capture(frame.Get()), -304) << "it has nothing at first";
+    EXPECT_TRUE(trace.Contains("[ShareCapturerCGSGCD::initBmpContext]"));
+    EXPECT_TRUE(trace.Contains("eScreenCapturerType=8 Success=1"));
+}
+
+TEST_F(DesktopCapturer, TakesTheBackEndsOfSessionsInTheirModes) {
+    for (const auto& [type, word] : {std::pair{7, "[ShareCapturerAVFoundation::initCapturer]"},
+                                     std::pair{10, "[ShareAVFCapturer setFPS to ]"}}) {
+        settings->m_nScreenCapturerType = type;
+        const CTraceLog trace;
+        CShareCapturerDesktopMac other(context);
+        EXPECT_TRUE(other.Reinit());
+        EXPECT_TRUE(trace.Contains(word)) << type;
+        EXPECT_TRUE(trace.Contains("eScreenCapturerType=" + std::to_string(type) + " Success=1"));
+    }
+}
+
 TEST_F(DesktopCapturer, TriesAgainAtEachCaptureWhileTheModeHasNoBackEnd) {
-    for (const int type : {7, 8, 10}) {
+    const CNoBackEndScope noBackEnd;
+    for (const int type : {7, 10}) {
         settings->m_nScreenCapturerType = type;
         const CTraceLog trace;
         CShareCapturerDesktopMac other(context);
@@ -161,7 +184,8 @@ TEST_F(DesktopCapturer, TriesAgainAtEachCaptureWhileTheModeHasNoBackEnd) {
 }
 
 TEST_F(DesktopCapturer, AnswersWithoutABackEnd) {
-    settings->m_nScreenCapturerType = 8;
+    const CNoBackEndScope noBackEnd;
+    settings->m_nScreenCapturerType = CNoBackEndScope::MODE;
     CShareCapturerDesktopMac none(context);
     none.AddSink(&sink);
     int x = 1;

@@ -59,7 +59,7 @@ protected:
     CServedScene desktop{Desk()};
     std::shared_ptr<ShareCapturerContext> context = std::make_shared<ShareCapturerContextMac>();
     ShareCapturerTovel backEnd;
-    FrameRef frame = NewFrame();
+    FrameRef frame = NewFrameRef();
 };
 
 } // namespace
@@ -111,6 +111,14 @@ TEST_F(DefaultBackEnd, CapturesWithStampAndMetaInformation) {
     desktop->SetPointer(CGPoint{10, 10});
     EXPECT_EQ(Capture(), 0u);
     EXPECT_EQ(backEnd.pointerCaptured(), 0) << "there is no cursor";
+}
+
+TEST_F(DefaultBackEnd, StampsAFrameOnceItsPictureIsThere) {
+    desktop->DoAt(SimulatedOperation::TakeWindowPicture, 1,
+                  [this] { clock->Advance(std::chrono::milliseconds(50)); });
+    const unsigned begun = ShareUtil::GetCaptureFrameTimeStamp();
+    EXPECT_EQ(Capture(), 0u);
+    EXPECT_EQ(frame.Get()->GetTimestamp(), begun + 50);
 }
 
 TEST_F(DefaultBackEnd, StampsTheFrameOfAFailureToo) {

@@ -152,7 +152,7 @@ protected:
 } // namespace
 
 TEST_F(WindowWalkOracle, AgreesWithThePainterOnEveryScene) {
-    const int scenes = SCENES * TestEffort();
+    const int scenes = TestRounds(SCENES);
     for (int i = 0; i < scenes; ++i) {
         const unsigned seed = FIRST_SEED + static_cast<unsigned>(i);
         ASSERT_EQ(Compare(seed), "") << "scene of seed " << seed;
