@@ -2,19 +2,9 @@
 # SPDX-License-Identifier: Apache-2.0
 #
 # Runs the program `screenshare` on the simulated desktop. Called with the program and the name of a case.
-set -uo pipefail
-readonly program=$1 limit=60 # Seconds that anything may take before it counts as hanging.
-work=$(mktemp -d)
-trap 'rm -rf "$work"' EXIT
-unset SCREENSHARE_TRACE DISPLAY WAYLAND_DISPLAY
-export SCREENSHARE_PLATFORM=simulated SCREENSHARE_DEBUG_DIR=$work
-
-fail() {
-    echo "FAILED: $*"
-    sed 's/^/    out: /' "$work/out"
-    sed 's/^/    err: /' "$work/err"
-    exit 1
-}
+# shellcheck source=tests/tool/simulated_case.sh
+. "$(dirname "${BASH_SOURCE[0]}")/simulated_case.sh"
+readonly program=$1
 
 # expect_exit CODE ARGUMENT...
 expect_exit() {
@@ -93,6 +83,30 @@ case_explain() {
     grep -q '>Share of monitor 1<' "$work/share.svg" || fail "an old picture is not replaced"
 }
 
+case_explain_as_json() {
+    command -v python3 >/dev/null || { echo "skipped: python3 is not installed"; exit 77; }
+    expect_answer explain --json --app 5000101 --exclude-window 8
+    cp "$work/out" "$work/printed"
+    python3 - "$work/printed" <<'END' || fail "the verdicts are not what they should be"
+import json, sys
+told = json.load(open(sys.argv[1]))
+assert told["share"] == "Share of application 5000101" and told["kept_out"] == "window 8", told
+assert told["monitors"] == [1, 2], told
+windows = {each["id"]: each for each in told["windows"]}
+assert windows[5]["verdict"] == "kept" and windows[5]["reason"] == "shared application", windows[5]
+assert windows[8]["verdict"] == "kept out" and windows[8]["reason"] == "unshared window", windows[8]
+assert windows[5]["width"] == 620 and windows[5]["application"] == "Editor", windows[5]
+area = lambda rects: sum(each["width"] * each["height"] for each in rects)
+assert 0 < area(told["visible"]) < 620 * 460 and area(told["background"]) > 0, told
+assert area(told["visible"]) + area(told["overlap"]) == 620 * 460, told
+END
+    expect_answer explain --json "$work/share.json" --app 5000101 --exclude-window 8
+    expect_lines 0
+    cmp -s "$work/printed" "$work/share.json" || fail "a file has something else"
+    expect_answer explain -
+    grep -q '^</svg>$' "$work/out" || fail "the picture does not come to standard output"
+}
+
 case_picture_is_well_formed() {
     command -v python3 >/dev/null || { echo "skipped: python3 is not installed"; exit 77; }
     expect_answer explain --window 5 "$work/share.svg"
@@ -119,17 +133,18 @@ case_ids_that_are_not_there() {
 }
 
 case_files_that_cannot_be_written() {
-    expect_refusal 1 "cannot write $work/none/share.svg: No such file or directory" explain "$work/none/share.svg"
-    expect_refusal 1 "cannot write $work: Is a directory" explain "$work"
+    expect_refusal 5 "cannot write $work/none/share.svg: No such file or directory" explain "$work/none/share.svg"
+    expect_refusal 5 "cannot write $work: Is a directory" explain "$work"
     [[ -w /dev/full ]] || return 0
-    expect_refusal 1 'cannot write /dev/full: No space left on device' explain /dev/full
+    expect_refusal 5 'cannot write /dev/full: No space left on device' explain /dev/full
     timeout $limit "$program" list windows >/dev/full 2>"$work/err"
-    [[ $? -eq 1 ]] || fail "a list that nobody gets is a success"
+    [[ $? -eq 5 ]] || fail "a list that nobody gets is a success"
+    grep -qF 'cannot write standard output: No space left on device' "$work/err" || fail "it does not say why"
 }
 
 case_command_lines_that_make_no_sense() {
-    expect_refusal 2 'subcommand is required'
-    expect_refusal 2 'subcommand is required' list
+    expect_refusal 2 'a command is missing; there are: list,'
+    expect_refusal 2 'list: a command is missing; there are: apps, windows, monitors;' list
     expect_refusal 2 'FILE.svg is required' explain
     expect_refusal 2 'FILE.svg is required' explain --app 5000101
     expect_refusal 2 '' explain --monitor one "$work/share.svg"

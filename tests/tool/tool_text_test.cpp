@@ -21,6 +21,12 @@ TEST(JsonText, WritesNullForWhatIsNoNumber) {
     EXPECT_EQ(JsonObjectText().Number("x", std::numeric_limits<double>::infinity()).Text(), "{\"x\": null}");
 }
 
+TEST(JsonText, JoinsMembersOfTwoObjects) {
+    const JsonObjectText some = JsonObjectText().Number("a", 1);
+    EXPECT_EQ(JsonObjectText().Number("b", 2).MembersOf(some).Text(), "{\"b\": 2, \"a\": 1}");
+    EXPECT_EQ(JsonObjectText().MembersOf(some).MembersOf({}).Text(), "{\"a\": 1}");
+}
+
 TEST(JsonText, WritesAnArrayWithoutElements) {
     EXPECT_EQ(JsonArrayText({}), "[]\n");
     EXPECT_EQ(JsonArrayText({"1", "2"}), "[\n  1,\n  2\n]\n");
@@ -52,4 +58,12 @@ TEST(TextTable, AlignsColumnsByCharactersAndShowsNoControlCharacters) {
     table.AddRow({"ä", "", "x\x1b[0m"});
     table.AddRow({"long", "2", "y"});
     EXPECT_EQ(table.Text(), "A     B  C\nä     -  x [0m\nlong  2  y\n");
+}
+
+TEST(TextColumns, PushesTheOthersAsideForACellThatIsTooWide) {
+    TextColumns columns;
+    columns.Widen({"A", "BB", "C"});
+    EXPECT_EQ(columns.Line({"1", "long one", "x"}), "1  long one  x\n");
+    EXPECT_EQ(columns.Line({"1", "", "x"}), "1  -   x\n");
+    EXPECT_EQ(columns.Line({"1", "2", "x", "more", "than there is"}), "1  2   x  more  than there is\n");
 }
