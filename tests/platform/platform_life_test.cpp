@@ -277,7 +277,9 @@ TEST_F(PlatformLife, AForkedChildFindsNoLockTakenAndNothingToWaitFor) {
 }
 
 TEST_F(PlatformLife, AProcessMayEndWithoutARest) {
-    // In a child of its own, which starts its own threads and leaves by exit.
+    // In a child of its own, which starts its own threads and leaves by exit. Not a fork of this process, whose
+    // other threads may hold any lock.
+    GTEST_FLAG_SET(death_test_style, "threadsafe");
     EXPECT_EXIT(
         {
             AddNoticeHandler(LIFE, {1, 1}, [](const Notice&) {});

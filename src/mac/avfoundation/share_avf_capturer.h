@@ -84,6 +84,9 @@ public:
     /// and pixels. -302 when there is no sample, -1 for null (a sample goes all the same), for samples that
     /// can't be opened or may not be, and for a picture with rows that are too short. `frame` may be null.
     unsigned captureToIShareFrame(IShareFrame* frame);
+    /// Of the last sample that was looked at: it did not pass since the window server could not tell which
+    /// stack it shows. On the capture thread.
+    bool isStackUntold() const { return m_isStackUntold; }
 
     void runtimeError(const platform::AVCaptureNotification& notification);
     void didStartRunning(const platform::AVCaptureNotification& notification);
@@ -127,4 +130,5 @@ private:
     ShareRelaxed<int> m_capture_width;
     ShareRelaxed<int> m_capture_height;
     std::optional<ShareSampleGate> m_gate; // capture thread only
+    bool m_isStackUntold = false;          // capture thread only
 };

@@ -102,7 +102,9 @@ unsigned ShareAVFCapturer::captureToIShareFrame(IShareFrame* frame) {
 
 /// Nothing for a sample that doesn't open.
 std::optional<int> ShareAVFCapturer::CopySample(const platform::CMSampleBuffer* sample, IShareFrame* frame) {
-    if (!MayBeSeen(sample, m_gate))
+    const bool mayBeSeen = MayBeSeen(sample, m_gate);
+    m_isStackUntold = !mayBeSeen && platform::CMSampleBufferGetGenerations(sample).before == 0;
+    if (!mayBeSeen)
         return std::nullopt;
     const OpenPicture picture(platform::CMSampleBufferGetImageBuffer(sample));
     if (!picture.IsOpen())

@@ -233,7 +233,8 @@ unsigned ShareCapturerSession::CopySample(IShareFrame* frame) {
     const unsigned code = m_ShareAVFCapturer->captureToIShareFrame(frame);
     if (code == static_cast<unsigned>(SHARE_CAPTURE_NO_DATA)) {
         BeginAnewWhenSilent();
-        return code;
+        // Between two samples that can't be used: while that goes on, the session gives nothing.
+        return m_ShareAVFCapturer->isStackUntold() ? static_cast<unsigned>(SHARE_CAPTURE_FAILED) : code;
     }
     m_isFresh = false;
     m_shown.reset();

@@ -1,10 +1,13 @@
 // SPDX-License-Identifier: Apache-2.0
 #include "src/mac/avfoundation/share_capturer_session.h"
 #include "tests/src/mac/avfoundation/session_bench.h"
+#include "tests/support/forwarding_window_server.h"
 #include "tests/support/memory_failure.h"
 
 #include <atomic>
+#include <chrono>
 #include <functional>
+#include <memory>
 #include <string>
 #include <utility>
 
@@ -15,6 +18,25 @@ using namespace platform;
 namespace {
 
 class SessionPrivacy : public SessionBackEnd {};
+
+/// Something is always to be seen on its displays that no snapshot lists, as a window that never paints
+/// itself.
+class CUntoldWindowServer final : public CForwardingWindowServer {
+public:
+    using CForwardingWindowServer::CForwardingWindowServer;
+
+protected:
+    platform::DisplayPictureResult TakeNewest(platform::DisplayStream& stream,
+                                              std::chrono::nanoseconds deadline) override {
+        platform::DisplayPictureResult result = CForwardingWindowServer::TakeNewest(stream, deadline);
+        if (result.picture != nullptr) {
+            auto picture = std::make_shared<platform::Picture>(*result.picture);
+            picture->generationBefore = 0;
+            result.picture = std::move(picture);
+        }
+        return result;
+    }
+};
 
 /// Does something once, when a line with that text is traced, on the thread that traces it.
 class CAtTrace {
@@ -64,6 +86,23 @@ TEST_P(SessionPrivacy, LooksAtNoSampleOfOtherWindowsThanItHasWalkedWhileSomethin
     Tick();
     EXPECT_EQ(Pass(), OK) << "the next one is of these windows";
     EXPECT_EQ(Count(WHITE), kind.IsMix() ? TEXT_PIXELS : TEXT_PIXELS - TEXT_UNDER_SECRET);
+    EXPECT_EQ(CountReddish(), 0);
+}
+
+TEST_P(SessionPrivacy, FailsWithoutABreakAsLongAsNobodyCanTellWhichWindowsItShows) {
+    KeepSecretsOut();
+    EXPECT_EQ(Show(), OK);
+    {
+        const CWindowServerScope untold(std::make_shared<CUntoldWindowServer>(CurrentWindowServer()));
+        Tick();
+        for (int pass = 0; pass < 20; ++pass) {
+            EXPECT_EQ(Pass(), FAILED) << pass << ": no data would pass for a screen that stands still";
+            AwaitSamples();
+        }
+    }
+    Tick();
+    Drain();
+    EXPECT_EQ(Show(), OK);
     EXPECT_EQ(CountReddish(), 0);
 }
 
