@@ -14,7 +14,7 @@ inline int TestEffort() {
 
 /// Rounds of a test that would keep a developer waiting if a sanitizer had it do as many as others.
 inline int TestRounds(int count) {
-    constexpr int SANITIZED_SHARE = 4;
+    constexpr int SANITIZED_SHARE = 6;
     const int share = SCREENSHARE_TEST_SANITIZED != 0 ? SANITIZED_SHARE : 1;
     return std::max(1, count * TestEffort() / share);
 }

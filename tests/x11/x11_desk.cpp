@@ -67,14 +67,16 @@ void X11Desk::StartPrograms() {
         m_panel = XProgram::Tint2(m_rig);
 }
 
-/// Windows that nobody sees: just outside of the screen, never mapped, and only for input.
+/// Windows that nobody sees: just outside of the screen, never mapped, and only for input. The first has a
+/// background: should somebody move it onto the screen, the server can paint it.
 void X11Desk::MakeMarker() {
     m_link = std::make_unique<XLink>(m_rig.Display());
     m_marker = xcb_generate_id(m_link->Get());
     const std::uint32_t redirect = 1;
+    const std::array<std::uint32_t, 2> painted{0, redirect};
     xcb_create_window(m_link->Get(), XCB_COPY_FROM_PARENT, m_marker, m_link->Root(), -10, -10, 1, 1, 0,
-                      XCB_WINDOW_CLASS_INPUT_OUTPUT, XCB_COPY_FROM_PARENT, XCB_CW_OVERRIDE_REDIRECT,
-                      &redirect);
+                      XCB_WINDOW_CLASS_INPUT_OUTPUT, XCB_COPY_FROM_PARENT,
+                      XCB_CW_BACK_PIXEL | XCB_CW_OVERRIDE_REDIRECT, painted.data());
     xcb_map_window(m_link->Get(), m_marker);
     m_question = xcb_generate_id(m_link->Get());
     xcb_create_window(m_link->Get(), XCB_COPY_FROM_PARENT, m_question, m_link->Root(), -10, -10, 1, 1, 0,

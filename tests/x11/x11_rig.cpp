@@ -73,12 +73,19 @@ bool IsReady(const XProgram::Ready& ready, const std::string& display) {
     return link.Works() && ready(link);
 }
 
+/// A name that no later connection has for a window of its own.
+xcb_window_t LastNameOf(const XLink& link) {
+    const xcb_setup_t& setup = *xcb_get_setup(link.Get());
+    return setup.resource_id_base | setup.resource_id_mask;
+}
+
 /// A window manager announces itself before it listens, and may lose what it is asked meanwhile. So it is one
-/// when it answers, however long that takes it.
+/// when it answers, however long that takes it. What it was asked more often than that it answers later, and
+/// puts a frame around whatever window has the name by then.
 bool HasWindowManager(const XLink& link) {
     if (link.Property(link.Root(), "_NET_SUPPORTING_WM_CHECK").empty())
         return false;
-    const xcb_window_t window = xcb_generate_id(link.Get());
+    const xcb_window_t window = LastNameOf(link);
     xcb_create_window(link.Get(), XCB_COPY_FROM_PARENT, window, link.Root(), -10, -10, 1, 1, 0,
                       XCB_WINDOW_CLASS_COPY_FROM_PARENT, XCB_COPY_FROM_PARENT, 0, nullptr);
     for (int attempt = 0; attempt < 40; ++attempt) {

@@ -85,7 +85,7 @@ void ExpectAliveWithoutLeaks(const Seen& seen) {
 } // namespace
 
 TEST(DesktopShareHammer, ShowsNothingThatIsKeptOutOfADesktopThatNeverRests) {
-    ExpectAliveWithoutLeaks(CaptureThroughUnrest(OfADesktop, nullptr, 600 * TestEffort()));
+    ExpectAliveWithoutLeaks(CaptureThroughUnrest(OfADesktop, nullptr, TestRounds(600)));
 }
 
 TEST(DesktopShareHammer, SeesTheLeakOfAServerThatGivesOutWhatIsUnshared) {
@@ -94,7 +94,7 @@ TEST(DesktopShareHammer, SeesTheLeakOfAServerThatGivesOutWhatIsUnshared) {
 }
 
 TEST(ApplicationShareHammer, ShowsNothingOfOtherApplications) {
-    ExpectAliveWithoutLeaks(CaptureThroughUnrest(OfAnApplication, nullptr, 600 * TestEffort()));
+    ExpectAliveWithoutLeaks(CaptureThroughUnrest(OfAnApplication, nullptr, TestRounds(600)));
 }
 
 TEST(ApplicationShareHammer, SeesTheLeakOfAServerThatGivesOutWhatIsUnshared) {
@@ -103,7 +103,7 @@ TEST(ApplicationShareHammer, SeesTheLeakOfAServerThatGivesOutWhatIsUnshared) {
 }
 
 TEST(WindowShareHammer, ShowsNothingOfOtherWindows) {
-    ExpectAliveWithoutLeaks(CaptureThroughUnrest(OfWindows, nullptr, 600 * TestEffort()));
+    ExpectAliveWithoutLeaks(CaptureThroughUnrest(OfWindows, nullptr, TestRounds(600)));
 }
 
 TEST(WindowShareHammer, SeesTheLeakOfAServerThatGivesOutWhatIsUnshared) {
