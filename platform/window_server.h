@@ -8,6 +8,7 @@
 #include <cstddef>
 #include <cstdint>
 #include <memory>
+#include <optional>
 #include <string>
 #include <utility>
 #include <vector>
@@ -183,6 +184,13 @@ struct PixelRect {
     bool operator==(const PixelRect&) const = default;
 };
 
+/// What makes a picture of a window different from an earlier one of the same window, size, format and part.
+struct PictureStep {
+    std::uint64_t serial = 0; ///< Of the earlier one.
+    /// From that one to the next newer one of the list; perhaps more and never less.
+    std::vector<PixelRect> changed;
+};
+
 /// One block of pixels, pinned while held: nobody writes to it any more.
 struct Picture {
     int width = 0;
@@ -198,6 +206,13 @@ struct Picture {
     /// whole picture at first, and nothing where only the generations are others. A layer tells nothing here:
     /// its picture is the same object as long as the window's pixels are the same.
     std::vector<PixelRect> changed;
+    /// Of a layer: a number that no other picture of this process has, of whatever server; 0 when the server
+    /// doesn't number its pictures. It tells pictures apart without keeping them, as their memory is used
+    /// again.
+    std::uint64_t serial = 0;
+    /// Of a layer: how it came out of earlier pictures, the newest first, each step leading up to the one
+    /// before it in the list and the first one up to this picture. Ends where nothing is known or kept.
+    std::vector<PictureStep> steps;
     /// Of a display: the generation of the oldest stack that the pixels may still show (where a compositor
     /// lags behind the stack, the one in force a settle time ago), and the generation after the fetch. Only
     /// when both are equal does the picture show that snapshot. Before is 0 where the stack can't be told:
@@ -226,6 +241,8 @@ struct WindowPicture {
     std::vector<PictureLayer> layers;
     std::chrono::nanoseconds time{0};
     std::uint64_t generation = 0; ///< The snapshot whose stack it shows.
+    /// Where the pointer was then, in points, if the server has learnt it on the way.
+    std::optional<CGPoint> pointer;
 };
 
 enum class PictureOutcome {
