@@ -1,6 +1,7 @@
 // SPDX-License-Identifier: Apache-2.0
 #include "platform/x11/window_storage.h"
 
+#include "platform/picture_changes.h"
 #include "platform/x11/paint_nudge.h"
 #include "util/cm_clock.h"
 
@@ -27,8 +28,9 @@ bool HoldTheSame(const Picture& one, const Picture& other) {
 
 } // namespace
 
-PicturePtr PictureOf(const ServerPixels& pixels, const std::shared_ptr<SharedPixels>& block, int width,
-                     const PixelRect& visible, const PixelRegion& shown, const CGRect& rect) {
+std::shared_ptr<Picture> PictureOf(const ServerPixels& pixels, const std::shared_ptr<SharedPixels>& block,
+                                   int width, const PixelRect& visible, const PixelRegion& shown,
+                                   const CGRect& rect) {
     const bool isWhole = shown == PixelRegion(visible);
     const std::size_t sourceStride = pixels.BytesPerRow(width);
     auto picture = std::make_shared<Picture>();
@@ -37,6 +39,7 @@ PicturePtr PictureOf(const ServerPixels& pixels, const std::shared_ptr<SharedPix
     picture->format = isWhole ? pixels.format : WithAlpha(pixels.format);
     picture->rect = rect;
     picture->time = CmSteadyNow();
+    picture->serial = NextPictureSerial();
     if (isWhole && pixels.packing == ServerPixels::Packing::Whole) {
         picture->stride = sourceStride;
         picture->pixels = block->Bytes() + static_cast<std::size_t>(visible.top) * sourceStride +
@@ -141,7 +144,6 @@ void WindowStorage::OnGone() {
 void WindowStorage::Void() {
     ForgetPixmap();
     m_pixels = StoredPixels();
-    m_isPictureOfPixels = false;
     m_changed = true;
     ++m_renewals;
 }
@@ -277,14 +279,21 @@ void WindowStorage::CountChanges(xcb_xfixes_region_t parts) {
 StoredPixels WindowStorage::TakePixels() {
     // If nobody else has the picture, its memory is to be written to.
     if (m_picture != nullptr && !m_isPictureCopied && IsOnlyShare(m_picture))
-        m_picture.reset();
-    m_isPictureOfPixels = false;
+        LetGoOfPicture();
     return std::exchange(m_pixels, StoredPixels());
 }
 
-void WindowStorage::GivePixels(StoredPixels pixels, bool isChanged) {
+/// How later ones come out of it is told all the same.
+void WindowStorage::LetGoOfPicture() {
+    m_former.serial = m_picture->serial;
+    m_former.steps = std::move(m_picture->steps);
+    m_former.format = m_picture->format;
+    m_picture.reset();
+}
+
+void WindowStorage::GivePixels(StoredPixels pixels, const PixelRegion& changed) {
+    m_unshown.Add(changed);
     m_pixels = std::move(pixels);
-    m_isPictureOfPixels = !isChanged && m_picture != nullptr;
 }
 
 // ---- Showing it
@@ -295,18 +304,31 @@ PicturePtr WindowStorage::Show(const PixelRect& visible, const PixelRegion& shap
     look.shown.Subtract(m_pixels.unproven);
     if (look.shown.IsEmpty() || m_pixels.block == nullptr)
         return nullptr;
-    if (m_picture != nullptr && m_isPictureOfPixels && look == m_look)
+    const bool looksAlike = look == m_look;
+    if (m_picture != nullptr && m_unshown.IsEmpty() && looksAlike)
         return m_picture;
-    PicturePtr picture =
+    std::shared_ptr<Picture> picture =
         PictureOf(m_pixels.pixels, m_pixels.block, m_pixels.width, visible, look.shown, rect);
     const bool isCopied = picture->memory != m_pixels.block;
-    if (!isCopied || !m_isPictureCopied || m_picture == nullptr || look != m_look ||
-        !HoldTheSame(*m_picture, *picture))
+    if (!isCopied || !m_isPictureCopied || m_picture == nullptr || !looksAlike ||
+        !HoldTheSame(*m_picture, *picture)) {
+        const Picture& before = m_picture != nullptr ? *m_picture : m_former;
+        if (looksAlike && before.format == picture->format)
+            picture->steps = StepsAfter(before, UnshownIn(visible));
         m_picture = std::move(picture);
+    }
     m_isPictureCopied = isCopied;
-    m_isPictureOfPixels = true;
+    m_unshown.Clear();
     m_look = std::move(look);
     return m_picture;
+}
+
+/// In pixels of a picture of `visible`.
+PixelRegion WindowStorage::UnshownIn(const PixelRect& visible) const {
+    PixelRegion unshown = m_unshown;
+    unshown.Intersect(visible);
+    unshown.Translate(-visible.left, -visible.top);
+    return unshown;
 }
 
 // ---- Keeping it
@@ -327,7 +349,7 @@ void WindowStorage::Drop() {
     m_changes.End();
     m_pixels = StoredPixels();
     m_picture.reset();
-    m_isPictureOfPixels = false;
+    m_former = Picture();
     m_changed = true;
 }
 

@@ -35,8 +35,9 @@ struct StoredPixels {
 
 /// A picture of `visible`, an area of pixels that the server sent; what of it is not `shown` is transparent.
 /// It shares the memory when it can.
-PicturePtr PictureOf(const ServerPixels& pixels, const std::shared_ptr<SharedPixels>& block, int width,
-                     const PixelRect& visible, const PixelRegion& shown, const CGRect& rect);
+std::shared_ptr<Picture> PictureOf(const ServerPixels& pixels, const std::shared_ptr<SharedPixels>& block,
+                                   int width, const PixelRect& visible, const PixelRegion& shown,
+                                   const CGRect& rect);
 
 /// A watch for changes or paintings of a window: a Damage object in the server.
 /// Threads: the X thread.
@@ -117,7 +118,8 @@ public:
     /// From here on changes count. Gives what was damaged so far to `parts`, which may be 0.
     void CountChanges(xcb_xfixes_region_t parts);
     StoredPixels TakePixels();
-    void GivePixels(StoredPixels pixels, bool isChanged);
+    /// `changed` is where they may be others than those that were taken.
+    void GivePixels(StoredPixels pixels, const PixelRegion& changed);
 
     int Width() const { return m_width; }
     int Height() const { return m_height; }
@@ -128,10 +130,10 @@ public:
 
     // Showing it.
     /// Of `visible`, the part of it that is `shape` and proven. Null when nothing is. The same object as long
-    /// as it looks the same.
+    /// as it looks the same; another one tells how it came out of those of the same look.
     PicturePtr Show(const PixelRect& visible, const PixelRegion& shape, const CGRect& rect);
     /// The last one that was shown, perhaps null.
-    const PicturePtr& LastShown() const { return m_picture; }
+    PicturePtr LastShown() const { return m_picture; }
 
     // Keeping it.
     std::size_t KeptBytes() const;
@@ -147,6 +149,8 @@ private:
 
     void SetSize(int width, int height, int border);
     void Void();
+    void LetGoOfPicture();
+    PixelRegion UnshownIn(const PixelRect& visible) const;
     std::optional<Nanoseconds> WatchEnds() const;
     std::optional<Nanoseconds> KeepingEnds() const;
     std::optional<Nanoseconds> NudgeTime() const;
@@ -169,9 +173,10 @@ private:
     std::optional<Nanoseconds> m_asked;
 
     StoredPixels m_pixels;
-    PicturePtr m_picture;
-    Look m_look;
-    bool m_isPictureOfPixels = false;
+    PixelRegion m_unshown; // where they may be others than those that were shown last
+    std::shared_ptr<Picture> m_picture;
+    Picture m_former;               // number, steps and format of the last one, when it was let go of
+    Look m_look;                    // of the last one
     bool m_isPictureCopied = false; // it has memory of its own
 };
 

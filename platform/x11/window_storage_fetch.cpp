@@ -84,7 +84,7 @@ bool StorageFetch::Finish() {
     if (m_failed)
         return Fail();
     if (!m_awaitsRows) {
-        m_storage->GivePixels(std::move(m_result), false);
+        m_storage->GivePixels(std::move(m_result), PixelRegion());
         return true;
     }
     const std::size_t stride = m_result.Stride();
@@ -102,7 +102,10 @@ bool StorageFetch::Finish() {
     // A window that was moved says that it has changed all over, and hasn't.
     const bool isSame =
         before != nullptr && std::memcmp(bytes + bandBegin, before + bandBegin, bandEnd - bandBegin) == 0;
-    m_storage->GivePixels(isSame ? std::move(m_before) : std::move(m_result), !isSame);
+    // What was painted meanwhile may be in the whole band already.
+    const PixelRect band{0, m_top, m_result.width, m_bottom};
+    m_storage->GivePixels(isSame ? std::move(m_before) : std::move(m_result),
+                          isSame ? PixelRegion() : PixelRegion(band));
     return true;
 }
 

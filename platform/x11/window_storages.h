@@ -64,9 +64,10 @@ public:
     /// One picture of the listed windows, in the order of the tree, all of one moment: when the stack changes
     /// meanwhile it is made again, at last with the server held. A window that is beyond LARGEST_STORAGE, or
     /// whose pixels nobody here can read, has no layer; one trace tells so.
+    /// `pointer` is where the pointer is, in points, if that is known.
     /// `catchUp` has the session take in every event that is here.
-    WindowPictureResult Take(const WindowPictureRequest& request, WindowTree& tree, const CGPoint& origin,
-                             const std::function<void()>& catchUp);
+    WindowPictureResult Take(const WindowPictureRequest& request, WindowTree& tree,
+                             const std::optional<CGPoint>& pointer, const std::function<void()>& catchUp);
 
     /// Whether windows show nothing but their own pixels in `place`, a part of the root. A new window, or one
     /// that has grown, shows on the screen as well what lay behind it, until it has painted. Windows that are

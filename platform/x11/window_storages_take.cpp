@@ -40,11 +40,13 @@ PixelRegion ShapeOf(const TopLevel& window) {
 /// One try at one picture.
 class WindowStorages::Taking {
 public:
-    Taking(State& state, const WindowPictureRequest& request, WindowTree& tree)
+    Taking(State& state, const WindowPictureRequest& request, WindowTree& tree,
+           const std::optional<CGPoint>& pointer)
         : m_state(state),
           m_rect(request.rect),
           m_asked(request.windows),
-          m_tree(tree) {
+          m_tree(tree),
+          m_pointer(pointer) {
         std::sort(m_asked.begin(), m_asked.end());
     }
 
@@ -76,6 +78,7 @@ private:
     const CGRect m_rect;
     std::vector<CGWindowID> m_asked; // sorted
     WindowTree& m_tree;
+    const std::optional<CGPoint> m_pointer;
     std::uint64_t m_generation = 0;
     bool m_anyExists = false;
     std::vector<Part> m_parts; // back to front
@@ -223,24 +226,26 @@ WindowPictureResult WindowStorages::Taking::Result() {
     }
     picture->time = CmSteadyNow();
     picture->generation = m_generation;
+    picture->pointer = m_pointer;
     return {PictureOutcome::Ok, std::move(picture)};
 }
 
 WindowPictureResult WindowStorages::Take(const WindowPictureRequest& request, WindowTree& tree,
-                                         const CGPoint& /*origin*/, const std::function<void()>& catchUp) {
+                                         const std::optional<CGPoint>& pointer,
+                                         const std::function<void()>& catchUp) {
     const Extensions& has = m_state->connection.Has();
     if (!has.composite || !has.damage || !has.xfixes)
         return {PictureOutcome::Unsupported, nullptr};
     m_state->isDueKnown = false;
     m_state->Trim();
     for (int i = 0; i < FREE_TRIES; ++i) {
-        if (auto result = Taking(*m_state, request, tree).Try(catchUp))
+        if (auto result = Taking(*m_state, request, tree, pointer).Try(catchUp))
             return *std::move(result);
     }
     const ServerGrab grab(m_state->connection);
     // What was sent before the server was held has to be here first.
     m_state->connection.RoundTrip();
-    if (auto result = Taking(*m_state, request, tree).Try(catchUp))
+    if (auto result = Taking(*m_state, request, tree, pointer).Try(catchUp))
         return *std::move(result);
     return {PictureOutcome::Stale, nullptr};
 }

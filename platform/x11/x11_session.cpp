@@ -274,19 +274,22 @@ Availability X11Session::GetCapability(Capability capability) const {
     return can ? Availability::Yes : Availability::No;
 }
 
+std::optional<CGPoint> X11Session::InPoints(const std::optional<CGPoint>& ofRoot) const {
+    if (!ofRoot)
+        return std::nullopt;
+    return CGPoint{ofRoot->x - m_displays.Origin().x, ofRoot->y - m_displays.Origin().y};
+}
+
 std::optional<CGPoint> X11Session::PointerPosition() {
-    std::optional<CGPoint> position = m_pointer.Position();
-    if (position)
-        *position = {position->x - m_displays.Origin().x, position->y - m_displays.Origin().y};
-    return position;
+    return InPoints(m_pointer.Position());
 }
 
 WindowPictureResult X11Session::TakeWindowPicture(const WindowPictureRequest& request) {
     // What was painted before the question has been heard of then, and a server that doesn't answer gives no
     // pictures, not even of what needn't be fetched.
-    m_connection.RoundTrip();
+    const std::optional<CGPoint> pointer = m_pointer.Position();
     CatchUp();
-    WindowPictureResult result = m_storages.Take(request, m_tree, m_displays.Origin(), [this] { Drain(); });
+    WindowPictureResult result = m_storages.Take(request, m_tree, InPoints(pointer), [this] { Drain(); });
     // Whoever has the picture finds the snapshot that it shows.
     CatchUp();
     return result;

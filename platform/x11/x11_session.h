@@ -76,6 +76,7 @@ private:
     void PublishDisplays();
     void UpdateApplications();
     void ReapApplications(std::chrono::nanoseconds now);
+    std::optional<CGPoint> InPoints(const std::optional<CGPoint>& ofRoot) const;
     std::uint64_t OldestShown();
     bool IsPainted(CGDirectDisplayID display);
 

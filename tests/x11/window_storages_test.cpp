@@ -1,4 +1,5 @@
 // SPDX-License-Identifier: Apache-2.0
+#include "platform/picture_changes.h"
 #include "tests/x11/storages_bench.h"
 
 namespace {
@@ -347,6 +348,37 @@ TEST(WindowStorages, FetchTheRowsThatHaveChangedAndNoOthers) {
     EXPECT_EQ(PixelAt(*changed, 13, 17), BLUE);
     EXPECT_EQ(PixelAt(*changed, 19, 20), BLUE);
     EXPECT_EQ(CountOf(*changed, GREEN), AREA - 28);
+}
+
+TEST(WindowStorages, NumberPicturesAndTellHowTheyCameOutOfEarlierOnes) {
+    StoragesBench bench;
+    bench.Begin();
+    const xcb_window_t window = bench.Show(PLACE);
+    const auto numberAfter = [&](const PixelRect& rect) {
+        bench.Fill(window, 0x0000FF, rect);
+        bench.Settle();
+        const PicturePtr picture = bench.TakeOne(window);
+        return picture != nullptr ? picture->serial : 0;
+    };
+    const std::uint64_t first = numberAfter({0, 0, 1, 1});
+    const std::uint64_t second = numberAfter({0, 10, 200, 20});
+    EXPECT_GT(first, 0U);
+    EXPECT_GT(second, first);
+    const PicturePtr held = bench.TakeOne(window);
+    EXPECT_EQ(held->serial, second);
+    EXPECT_EQ(ChangesSince(*held, first), PixelRegion(PixelRect{0, 10, 200, 20}));
+    const std::uint64_t third = numberAfter({0, 50, 200, 60});
+    const PicturePtr last = bench.TakeOne(window);
+    ASSERT_EQ(last->serial, third);
+    PixelRegion both(PixelRect{0, 10, 200, 20});
+    both.Add(PixelRect{0, 50, 200, 60});
+    EXPECT_EQ(ChangesSince(*last, first), both);
+    EXPECT_EQ(ChangesSince(*last, second), PixelRegion(PixelRect{0, 50, 200, 60}));
+    bench.Resize(window, 210, 100);
+    EXPECT_TRUE(bench.ComesTrueMeanwhile([&] {
+        const PicturePtr other = bench.TakeOne(window);
+        return other != nullptr && other->serial > third && !ChangesSince(*other, third);
+    }));
 }
 
 TEST(WindowStorages, NeverWriteToAPictureThatSomebodyHolds) {

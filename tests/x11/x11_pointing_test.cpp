@@ -253,4 +253,29 @@ TEST_F(X11Pointing, TellsPositionsFromTheTopLeftOfItsDisplayAndNoneElsewhere) {
     EXPECT_TRUE(HearsOf(mouse, {origin.x + 31, origin.y + 40}, "31,40"));
 }
 
+TEST_F(X11Pointing, IsToldWithThePicturesOfWindows) {
+    if (!Begin(XServer::Kind::Xorg))
+        return;
+    const auto toldWithPicture = [&] {
+        platform::WindowPictureRequest request;
+        request.rect = {{0, 0}, {4000, 4000}};
+        for (const platform::WindowInfo& window : Desk().Server().GetWindows()->Windows())
+            request.windows.push_back(window.id);
+        request.deadline = CmSteadyNow() + PATIENCE;
+        const auto taken = Desk().Server().TakeWindowPicture(request);
+        return taken.picture != nullptr ? taken.picture->pointer : std::nullopt;
+    };
+    Desk().MovePointer({301, 202});
+    EXPECT_EQ(toldWithPicture(), (platform::CGPoint{301, 202}));
+    const std::optional<platform::CGDirectDisplayID> side = Desk().AddDisplay({640, 480});
+    ASSERT_TRUE(side);
+    ASSERT_TRUE(Desk().MakeMain(*side));
+    ASSERT_TRUE(ComesTrue([&] { return platform::CGMainDisplayID() == *side; }));
+    Desk().MovePointer({40, 30}); // of the root
+    platform::CGPoint asked;
+    ASSERT_TRUE(Desk().Server().GetPointerPosition(asked));
+    EXPECT_EQ(asked, (platform::CGPoint{40 - 1280, 30}));
+    EXPECT_EQ(toldWithPicture(), asked);
+}
+
 } // namespace
