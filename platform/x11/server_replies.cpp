@@ -80,4 +80,9 @@ std::vector<xcb_rectangle_t> RectanglesFrom(const xcb_shape_get_rectangles_reply
     return ItemsFrom<xcb_rectangle_t>(BytesBehind(reply), reply.rectangles_len);
 }
 
+std::vector<xcb_rectangle_t> RectanglesFrom(const xcb_xfixes_fetch_region_reply_t& reply) {
+    const std::span<const std::uint8_t> bytes = BytesBehind(reply);
+    return ItemsFrom<xcb_rectangle_t>(bytes, bytes.size() / sizeof(xcb_rectangle_t));
+}
+
 } // namespace platform::x11

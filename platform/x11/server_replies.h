@@ -6,6 +6,7 @@
 #include <xcb/randr.h>
 #include <xcb/shape.h>
 #include <xcb/xcb.h>
+#include <xcb/xfixes.h>
 
 #include <string>
 #include <vector>
@@ -37,5 +38,7 @@ std::string EdidFrom(const xcb_randr_get_output_property_reply_t* reply);
 std::vector<xcb_window_t> ChildrenFrom(const xcb_query_tree_reply_t& reply);
 std::vector<xcb_atom_t> AtomsFrom(const xcb_list_properties_reply_t& reply);
 std::vector<xcb_rectangle_t> RectanglesFrom(const xcb_shape_get_rectangles_reply_t& reply);
+/// From top to bottom.
+std::vector<xcb_rectangle_t> RectanglesFrom(const xcb_xfixes_fetch_region_reply_t& reply);
 
 } // namespace platform::x11

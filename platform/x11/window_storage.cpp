@@ -2,7 +2,9 @@
 #include "platform/x11/window_storage.h"
 
 #include "platform/picture_changes.h"
+#include "platform/x11/fetch_plan.h"
 #include "platform/x11/paint_nudge.h"
+#include "platform/x11/server_replies.h"
 #include "util/cm_clock.h"
 
 #include <xcb/composite.h>
@@ -17,6 +19,8 @@ namespace {
 
 /// A window that paints in thousands of little strokes would fill the socket.
 constexpr unsigned MOST_REPORTS = 256;
+/// Of more rectangles of damage than that, some are told by what lies around them.
+constexpr std::size_t MOST_RECTANGLES = 64;
 /// Set when another rectangle of the same report follows.
 constexpr std::uint8_t MORE_FOLLOW = 0x80;
 
@@ -143,8 +147,7 @@ void WindowStorage::OnGone() {
 /// What was fetched shows a storage that isn't the window's any more.
 void WindowStorage::Void() {
     ForgetPixmap();
-    m_pixels = StoredPixels();
-    m_changed = true;
+    ForgetPixels();
     ++m_renewals;
 }
 
@@ -198,12 +201,15 @@ void WindowStorage::WatchPaintings(Nanoseconds now) {
     m_watchedSince = now;
 }
 
-void WindowStorage::Ask(const PixelRegion& shape, Nanoseconds now) {
+void WindowStorage::Ask(const std::optional<PixelRegion>& shape, Nanoseconds now) {
     if (!m_asked || now - *m_asked > WANTED_TIME)
         m_proof.StartNudging(now);
     m_asked = now;
+    if (m_proof.IsProven())
+        return m_paintings.End();
     PixelRegion missing = m_proof.Unproven();
-    missing.Intersect(shape);
+    if (shape)
+        missing.Intersect(*shape);
     if (missing.IsEmpty())
         m_paintings.End();
     else if (!m_paintings.IsOn())
@@ -250,8 +256,12 @@ void WindowStorage::DoDue(Nanoseconds now) {
 
 // ---- Fetching it
 
-bool WindowStorage::IsCurrent(int width, int height, const ServerPixels& pixels) const {
-    return !m_changed && m_pixels.IsOf(width, height, pixels) && m_pixels.unproven == m_proof.Unproven();
+bool WindowStorage::HasPixels(const ServerPixels& pixels) const {
+    return m_pixels.IsOf(m_width, m_height, pixels) && m_pixels.unproven == m_proof.Unproven();
+}
+
+bool WindowStorage::IsCurrent(const ServerPixels& pixels) const {
+    return !m_changed && m_questions.empty() && m_damage.IsEmpty() && HasPixels(pixels);
 }
 
 xcb_pixmap_t WindowStorage::Pixmap() {
@@ -268,19 +278,62 @@ void WindowStorage::ForgetPixmap() {
     m_pixmap = 0;
 }
 
-void WindowStorage::CountChanges(xcb_xfixes_region_t parts) {
+void WindowStorage::CountChanges() {
     if (!m_changes.IsOn())
         m_changes.Begin(m_connection, m_window, XCB_DAMAGE_REPORT_LEVEL_NON_EMPTY);
-    m_changes.CountFrom(xcb_damage_subtract(m_connection.Get(), m_changes.Get(), 0, parts).sequence);
+    m_changes.CountFrom(xcb_damage_subtract(m_connection.Get(), m_changes.Get(), 0, 0).sequence);
     m_changed = false;
 }
 
-/// Until they are given back there are none.
+void WindowStorage::AskForDamage(xcb_xfixes_region_t parts) {
+    m_questions.reserve(m_questions.size() + 1); // once it is asked, the answer must not be missed
+    m_changes.CountFrom(xcb_damage_subtract(m_connection.Get(), m_changes.Get(), 0, parts).sequence);
+    m_questions.push_back(m_connection.Ask<xcb_xfixes_fetch_region_reply_t>(
+        xcb_xfixes_fetch_region(m_connection.Get(), parts)));
+    m_changed = false;
+}
+
+bool WindowStorage::AwaitDamage() {
+    // What the server has counted off is known to nobody else: without the answer there are no pixels.
+    StoredPixels pixels = std::exchange(m_pixels, StoredPixels());
+    for (auto& question : m_questions) {
+        const auto answer = m_connection.Await(question);
+        if (answer == nullptr)
+            return false;
+        AddDamage(*answer);
+    }
+    m_questions.clear();
+    m_pixels = std::move(pixels);
+    return true;
+}
+
+void WindowStorage::AddDamage(const xcb_xfixes_fetch_region_reply_t& answer) {
+    const PixelRect all{0, 0, m_width, m_height};
+    std::vector<PixelRect> rects;
+    for (const xcb_rectangle_t& each : RectanglesFrom(answer)) {
+        const int left = each.x + m_border;
+        const int top = each.y + m_border;
+        rects.push_back({left, top, left + each.width, top + each.height});
+    }
+    for (const PixelRect& rect : FewerRects(rects, MOST_RECTANGLES))
+        m_damage.Add(rect);
+    m_damage.Intersect(all);
+}
+
+/// Until they are given back there are none, and nothing is known to be damaged.
 StoredPixels WindowStorage::TakePixels() {
     // If nobody else has the picture, its memory is to be written to.
     if (m_picture != nullptr && !m_isPictureCopied && IsOnlyShare(m_picture))
         LetGoOfPicture();
-    return std::exchange(m_pixels, StoredPixels());
+    StoredPixels pixels = std::move(m_pixels);
+    ForgetPixels();
+    return pixels;
+}
+
+void WindowStorage::ForgetPixels() {
+    m_pixels = StoredPixels();
+    m_questions.clear();
+    m_damage.Clear();
 }
 
 /// How later ones come out of it is told all the same.
@@ -298,29 +351,55 @@ void WindowStorage::GivePixels(StoredPixels pixels, const PixelRegion& changed) 
 
 // ---- Showing it
 
-PicturePtr WindowStorage::Show(const PixelRect& visible, const PixelRegion& shape, const CGRect& rect) {
-    Look look{visible, shape};
-    look.shown.Intersect(visible);
-    look.shown.Subtract(m_pixels.unproven);
-    if (look.shown.IsEmpty() || m_pixels.block == nullptr)
+WindowStorage::Look WindowStorage::LookOf(const PixelRect& visible,
+                                          const std::optional<PixelRegion>& shape) const {
+    Look look{visible, std::nullopt};
+    if (!shape && m_pixels.unproven.IsEmpty())
+        return look;
+    PixelRegion shown(visible);
+    if (shape)
+        shown.Intersect(*shape);
+    shown.Subtract(m_pixels.unproven);
+    if (!(shown == PixelRegion(visible)))
+        look.shown = std::move(shown);
+    return look;
+}
+
+PicturePtr WindowStorage::Show(const PixelRect& visible, const std::optional<PixelRegion>& shape,
+                               const CGRect& rect) {
+    Look look = LookOf(visible, shape);
+    if (m_pixels.block == nullptr || (look.shown && look.shown->IsEmpty()))
         return nullptr;
     const bool looksAlike = look == m_look;
     if (m_picture != nullptr && m_unshown.IsEmpty() && looksAlike)
         return m_picture;
-    std::shared_ptr<Picture> picture =
-        PictureOf(m_pixels.pixels, m_pixels.block, m_pixels.width, visible, look.shown, rect);
+    std::shared_ptr<Picture> picture = PictureOf(m_pixels.pixels, m_pixels.block, m_pixels.width, visible,
+                                                 look.shown ? *look.shown : PixelRegion(visible), rect);
     const bool isCopied = picture->memory != m_pixels.block;
     if (!isCopied || !m_isPictureCopied || m_picture == nullptr || !looksAlike ||
         !HoldTheSame(*m_picture, *picture)) {
-        const Picture& before = m_picture != nullptr ? *m_picture : m_former;
-        if (looksAlike && before.format == picture->format)
-            picture->steps = StepsAfter(before, UnshownIn(visible));
+        if (looksAlike)
+            TellSteps(*picture);
         m_picture = std::move(picture);
     }
     m_isPictureCopied = isCopied;
     m_unshown.Clear();
     m_look = std::move(look);
     return m_picture;
+}
+
+/// How a picture of the same look came out of the last one.
+void WindowStorage::TellSteps(Picture& picture) {
+    const Picture& before = m_picture != nullptr ? *m_picture : m_former;
+    if (before.format != picture.format || before.serial == 0)
+        return;
+    if (m_picture != nullptr || !m_unshown.IsEmpty()) {
+        picture.steps = StepsAfter(before, UnshownIn(m_look.visible));
+        return;
+    }
+    // It is that one again: nobody has held it, and nothing was written over it.
+    picture.serial = m_former.serial;
+    picture.steps = m_former.steps;
 }
 
 /// In pixels of a picture of `visible`.
@@ -347,10 +426,9 @@ bool WindowStorage::IsHeldByOthers() const {
 void WindowStorage::Drop() {
     ForgetPixmap();
     m_changes.End();
-    m_pixels = StoredPixels();
+    ForgetPixels();
     m_picture.reset();
     m_former = Picture();
-    m_changed = true;
 }
 
 } // namespace platform::x11

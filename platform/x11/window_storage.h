@@ -11,11 +11,13 @@
 
 #include <xcb/damage.h>
 #include <xcb/xcb.h>
+#include <xcb/xfixes.h>
 
 #include <chrono>
 #include <cstddef>
 #include <memory>
 #include <optional>
+#include <vector>
 
 namespace platform::x11 {
 
@@ -101,8 +103,8 @@ public:
     // Watching it.
     void WatchPaintings(Nanoseconds now);
     const PaintProof& Proof() const { return m_proof; }
-    /// Somebody asks for it; `shape` is all of it that can be seen.
-    void Ask(const PixelRegion& shape, Nanoseconds now);
+    /// Somebody asks for it; `shape` is what of it can be seen, nothing for all of it.
+    void Ask(const std::optional<PixelRegion>& shape, Nanoseconds now);
     /// Somebody asks for its last picture, since it isn't on the screen.
     void AskForLast(Nanoseconds now) { m_asked = now; }
     std::optional<Nanoseconds> Asked() const { return m_asked; }
@@ -111,12 +113,25 @@ public:
     void DoDue(Nanoseconds now);
 
     // Fetching it.
-    bool IsCurrent(int width, int height, const ServerPixels& pixels) const;
+    /// All of its pixels are here, perhaps but for some damage.
+    bool HasPixels(const ServerPixels& pixels) const;
+    /// Something has been painted since the damage was asked for last.
+    bool HasChanged() const { return m_changed; }
+    /// Nothing is to be fetched.
+    bool IsCurrent(const ServerPixels& pixels) const;
     /// Named anew for each storage.
     xcb_pixmap_t Pixmap();
     void ForgetPixmap();
-    /// From here on changes count. Gives what was damaged so far to `parts`, which may be 0.
-    void CountChanges(xcb_xfixes_region_t parts);
+    /// From here on changes count.
+    void CountChanges();
+    /// The same, and asks by way of `parts` for what was damaged so far.
+    void AskForDamage(xcb_xfixes_region_t parts);
+    /// It has changed, and what of it would be all that is to be fetched; nobody has asked yet.
+    bool IsDamageWorthAsking() const { return m_changed && m_pixels.block != nullptr && m_questions.empty(); }
+    /// False when it can't be had.
+    bool AwaitDamage();
+    /// Where pixels may be others than those that were fetched, as far as that was asked for and answered.
+    const PixelRegion& Damage() const { return m_damage; }
     StoredPixels TakePixels();
     /// `changed` is where they may be others than those that were taken.
     void GivePixels(StoredPixels pixels, const PixelRegion& changed);
@@ -129,9 +144,9 @@ public:
     unsigned Renewals() const { return m_renewals; }
 
     // Showing it.
-    /// Of `visible`, the part of it that is `shape` and proven. Null when nothing is. The same object as long
-    /// as it looks the same; another one tells how it came out of those of the same look.
-    PicturePtr Show(const PixelRect& visible, const PixelRegion& shape, const CGRect& rect);
+    /// Of `visible`, the part of it that is `shape`, if there is one, and proven. Null when nothing is. The
+    /// same object as long as it looks the same; another one tells how it came out of those of the same look.
+    PicturePtr Show(const PixelRect& visible, const std::optional<PixelRegion>& shape, const CGRect& rect);
     /// The last one that was shown, perhaps null.
     PicturePtr LastShown() const { return m_picture; }
 
@@ -143,13 +158,17 @@ public:
 private:
     struct Look {
         PixelRect visible;
-        PixelRegion shown;
+        std::optional<PixelRegion> shown; ///< Nothing for all of it.
         bool operator==(const Look&) const = default;
     };
 
     void SetSize(int width, int height, int border);
     void Void();
+    void ForgetPixels();
+    Look LookOf(const PixelRect& visible, const std::optional<PixelRegion>& shape) const;
     void LetGoOfPicture();
+    void AddDamage(const xcb_xfixes_fetch_region_reply_t& answer);
+    void TellSteps(Picture& picture);
     PixelRegion UnshownIn(const PixelRect& visible) const;
     std::optional<Nanoseconds> WatchEnds() const;
     std::optional<Nanoseconds> KeepingEnds() const;
@@ -164,8 +183,10 @@ private:
     xcb_pixmap_t m_pixmap = 0;
     unsigned m_renewals = 0;
 
-    DamageWatch m_changes; // since the pixels were fetched
+    DamageWatch m_changes; // since the damage was asked for last
     bool m_changed = true;
+    std::vector<Pending<xcb_xfixes_fetch_region_reply_t>> m_questions; // in their order
+    PixelRegion m_damage;
     DamageWatch m_paintings; // while not all is proven
     unsigned m_reports = 0;
     Nanoseconds m_watchedSince{0};

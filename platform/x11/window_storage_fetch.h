@@ -1,6 +1,7 @@
 // SPDX-License-Identifier: Apache-2.0
 #pragma once
 
+#include "platform/pixel_region.h"
 #include "platform/x11/shared_pixels.h"
 #include "platform/x11/window_storage.h"
 #include "platform/x11/x11_connection.h"
@@ -9,6 +10,7 @@
 
 #include <cstddef>
 #include <memory>
+#include <vector>
 
 namespace platform::x11 {
 
@@ -20,10 +22,12 @@ struct FetchTools {
 };
 
 /// Brings what is known of a storage's pixels up to date. Where the pixels are known but for some damage,
-/// only the rows of that are fetched, in place unless somebody holds the picture.
+/// only that is fetched, in place unless somebody holds the picture: rows that are damaged for the most part
+/// straight into the pixels, what is narrower by way of other memory.
 ///
-/// Used in three steps, so that those of many windows go together: Ask, then AskForRows, then Finish. If it
-/// ends before, nothing is known of the pixels any more.
+/// Used in four steps, so that those of many windows go together: Ask, AskForPixels, Finish, and Give when
+/// every event is here that was sent before the last answer. If it ends before, nothing is known of the
+/// pixels any more, unless nothing had changed.
 /// Threads: the X thread.
 /// Errors:  those of X11Connection.
 class StorageFetch {
@@ -31,28 +35,41 @@ public:
     StorageFetch(const FetchTools& tools, std::shared_ptr<WindowStorage> storage, const ServerPixels& pixels);
 
     void Ask();
-    void AskForRows();
-    /// False when there are no pixels, as when the window is gone.
-    bool Finish();
+    void AskForPixels();
+    void Finish();
+    /// Without pixels, as when the window is gone, it gives none.
+    void Give();
     std::size_t BytesAskedFor() const { return m_bytesAskedFor; }
 
 private:
+    struct Piece {
+        PixelRect rect;
+        bool isOfRows = false; ///< Whole rows, which the server writes straight into the pixels.
+        std::size_t offset = 0;
+        RowsRead read{};
+    };
+
     void AskForAll();
-    void AskForBand(int top, int bottom);
-    bool Fail();
+    /// Pieces that cover the damage, from top to bottom.
+    void Plan(const PixelRegion& damage);
+    bool TakeMemory();
+    void AskFor(Piece& piece);
+    void CopyOthersRows();
+    void TakeInRows(const Piece& piece);
+    void TakeInCopied(const Piece& piece);
+    void Fail();
 
     FetchTools m_tools;
     std::shared_ptr<WindowStorage> m_storage;
     ServerPixels m_pixels;
-    Pending<xcb_xfixes_fetch_region_reply_t> m_damage;
-    bool m_awaitsDamage = false;
-    RowsRead m_rows;
-    bool m_awaitsRows = false;
+    unsigned m_renewals;
+    PixelRegion m_damage;
+    std::vector<Piece> m_pieces; ///< Empty when nothing had changed.
     bool m_failed = false;
-    int m_top = 0;
-    int m_bottom = 0;
-    StoredPixels m_before; ///< Left as they are, because somebody holds them.
+    std::shared_ptr<SharedPixels> m_narrow; ///< What isn't of whole rows.
+    StoredPixels m_before;                  ///< Left as they are, because somebody holds them.
     StoredPixels m_result;
+    PixelRegion m_written; ///< Where the result is another one than before.
     std::size_t m_bytesAskedFor = 0;
 };
 

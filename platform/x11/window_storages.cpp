@@ -12,6 +12,7 @@
 #include <xcb/shape.h>
 
 #include <algorithm>
+#include <cstddef>
 #include <utility>
 #include <vector>
 
@@ -26,6 +27,9 @@ using Nanoseconds = std::chrono::nanoseconds;
 constexpr Nanoseconds TRIM_TIME = std::chrono::seconds(1);
 /// Idle memory is kept a little longer than what it held.
 constexpr Nanoseconds IDLE_TIME = std::chrono::seconds(5);
+
+/// Of pixels that are remembered; a screen has a handful.
+constexpr std::size_t MOST_KINDS = 64;
 
 /// The window whose children have been rearranged in a way that makes others visible, or moves pixels; 0 when
 /// that isn't told.
@@ -132,9 +136,22 @@ WindowStorage* WindowStorages::State::Find(xcb_window_t window) {
     return found != storages.end() ? found->second.get() : nullptr;
 }
 
+const WindowStorages::State::KnownPixels& WindowStorages::State::KnownPixelsOf(std::uint8_t depth,
+                                                                               xcb_visualid_t visual) {
+    const auto found = std::find_if(knownPixels.begin(), knownPixels.end(), [&](const KnownPixels& each) {
+        return each.depth == depth && each.visual == visual;
+    });
+    if (found != knownPixels.end())
+        return *found;
+    if (knownPixels.size() == MOST_KINDS)
+        knownPixels.clear();
+    knownPixels.push_back(
+        {depth, visual, ServerPixelsOf(connection.Setup(), connection.Screen(), depth, visual)});
+    return knownPixels.back();
+}
+
 std::optional<ServerPixels> WindowStorages::State::PixelsOf(std::uint8_t depth, xcb_visualid_t visual) {
-    const xcb_setup_t* const setup = xcb_get_setup(connection.Get());
-    std::optional<ServerPixels> pixels = ServerPixelsOf(*setup, connection.Screen(), depth, visual);
+    std::optional<ServerPixels> pixels = KnownPixelsOf(depth, visual).pixels;
     if (!pixels) {
         if (!std::exchange(hasTracedPixels, true))
             CmTraceWarning("[WindowStorages]>>pixels of a kind that can't be read, depth ", int{depth});

@@ -61,6 +61,10 @@ public:
     std::optional<std::chrono::nanoseconds> NextDue() const;
     void DoDue();
 
+    /// Asks for the damage of windows that are known to have changed, so that the next answer of the server
+    /// brings it along and a picture needn't wait for it once more.
+    void AskAhead();
+
     /// One picture of the listed windows, in the order of the tree, all of one moment: when the stack changes
     /// meanwhile it is made again, at last with the server held. A window that is beyond LARGEST_STORAGE, or
     /// whose pixels nobody here can read, has no layer; one trace tells so.

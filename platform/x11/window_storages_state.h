@@ -14,6 +14,7 @@
 #include <memory>
 #include <optional>
 #include <unordered_map>
+#include <vector>
 
 /// What window_storages.cpp and window_storages_take.cpp share.
 namespace platform::x11 {
@@ -21,11 +22,18 @@ namespace platform::x11 {
 struct WindowStorages::State {
     explicit State(X11Connection& theConnection) : connection(theConnection), pool(theConnection) {}
 
+    struct KnownPixels {
+        std::uint8_t depth = 0;
+        xcb_visualid_t visual = 0;
+        std::optional<ServerPixels> pixels;
+    };
+
     WindowStorage* Find(xcb_window_t window);
     /// Of those that are mapped.
     bool AreAllProven() const;
     /// How its pixels lie and are to be given out; nothing, with one trace, when they can't be.
     std::optional<ServerPixels> PixelsOf(std::uint8_t depth, xcb_visualid_t visual);
+    const KnownPixels& KnownPixelsOf(std::uint8_t depth, xcb_visualid_t visual);
     void CountTraffic(std::size_t bytes);
     void OnRearranged(xcb_window_t parent, unsigned sequence);
     /// Has all paintings believed that were told so far; asks the server if there are any.
@@ -41,6 +49,7 @@ struct WindowStorages::State {
     std::unordered_map<xcb_window_t, std::shared_ptr<WindowStorage>> storages;
     Wallpaper wallpaper;
     xcb_xfixes_region_t parts = 0;
+    std::vector<KnownPixels> knownPixels; // of the kinds that windows have had so far
     bool composited = false;
     bool hasTracedPixels = false;
     bool hasTracedSize = false;

@@ -23,15 +23,18 @@ bool Touch(const CGRect& one, const CGRect& other) {
            other.origin.y < one.origin.y + one.size.height;
 }
 
-/// All of a storage that can be seen.
-PixelRegion ShapeOf(const TopLevel& window) {
-    const PixelRect all{0, 0, window.StorageWidth(), window.StorageHeight()};
+PixelRect StorageOf(const TopLevel& window) {
+    return {0, 0, window.StorageWidth(), window.StorageHeight()};
+}
+
+/// What of a storage can be seen; nothing for all of it.
+std::optional<PixelRegion> ShapeOf(const TopLevel& window) {
     if (!window.shaped)
-        return PixelRegion(all);
+        return std::nullopt;
     PixelRegion shape;
     for (const PixelRect& rect : window.shape)
         shape.Add(rect);
-    shape.Intersect(all);
+    shape.Intersect(StorageOf(window));
     return shape;
 }
 
@@ -60,7 +63,7 @@ private:
         std::shared_ptr<WindowStorage> storage; // none for what has its picture already
         ServerPixels pixels;
         PixelRect visible;
-        PixelRegion shape;
+        std::optional<PixelRegion> shape;
         unsigned renewals = 0;
     };
 
@@ -82,6 +85,7 @@ private:
     std::uint64_t m_generation = 0;
     bool m_anyExists = false;
     std::vector<Part> m_parts; // back to front
+    std::vector<StorageFetch> m_fetches;
 };
 
 std::optional<WindowPictureResult> WindowStorages::Taking::Try(const std::function<void()>& catchUp) {
@@ -187,17 +191,15 @@ bool WindowStorages::Taking::IsTooLarge(const TopLevel& window) {
 }
 
 void WindowStorages::Taking::Fetch() {
-    std::vector<StorageFetch> fetches;
     for (const Part& part : m_parts) {
-        const auto& storage = part.storage;
-        if (storage != nullptr && !storage->IsCurrent(storage->Width(), storage->Height(), part.pixels))
-            fetches.emplace_back(m_state.Tools(), storage, part.pixels);
+        if (part.storage != nullptr && !part.storage->IsCurrent(part.pixels))
+            m_fetches.emplace_back(m_state.Tools(), part.storage, part.pixels);
     }
-    for (StorageFetch& fetch : fetches)
+    for (StorageFetch& fetch : m_fetches)
         fetch.Ask();
-    for (StorageFetch& fetch : fetches)
-        fetch.AskForRows();
-    for (StorageFetch& fetch : fetches) {
+    for (StorageFetch& fetch : m_fetches)
+        fetch.AskForPixels();
+    for (StorageFetch& fetch : m_fetches) {
         fetch.Finish();
         m_state.CountTraffic(fetch.BytesAskedFor());
     }
@@ -206,6 +208,8 @@ void WindowStorages::Taking::Fetch() {
 /// Every event that was sent before the last answer is here by now.
 bool WindowStorages::Taking::IsStillTrue(const std::function<void()>& catchUp) {
     catchUp();
+    for (StorageFetch& fetch : m_fetches)
+        fetch.Give();
     if (!m_tree.IsSettled())
         return false;
     const bool isRenewed = std::any_of(m_parts.begin(), m_parts.end(), [](const Part& part) {
@@ -228,6 +232,13 @@ WindowPictureResult WindowStorages::Taking::Result() {
     picture->generation = m_generation;
     picture->pointer = m_pointer;
     return {PictureOutcome::Ok, std::move(picture)};
+}
+
+void WindowStorages::AskAhead() {
+    for (const auto& [window, storage] : m_state->storages) {
+        if (storage->IsDamageWorthAsking())
+            storage->AskForDamage(m_state->Tools().parts);
+    }
 }
 
 WindowPictureResult WindowStorages::Take(const WindowPictureRequest& request, WindowTree& tree,
@@ -271,13 +282,14 @@ bool WindowStorages::ArePainted(const PixelRect& place, const WindowTree& tree,
         WindowStorage* const storage = state.Find(window->window);
         if (storage == nullptr || !window->mapped || window->inputOnly)
             continue;
-        PixelRegion shape = ShapeOf(*window);
+        const std::optional<PixelRegion> bounding = ShapeOf(*window);
+        PixelRegion shape = bounding ? *bounding : PixelRegion(StorageOf(*window));
         PixelRegion foreign = storage->Proof().Unproven();
         foreign.Intersect(shape);
         foreign.Translate(window->x, window->y);
         foreign.Intersect(uncovered);
         if (!foreign.IsEmpty()) {
-            storage->Ask(ShapeOf(*window), CmSteadyNow());
+            storage->Ask(bounding, CmSteadyNow());
             arePainted = false;
         }
         // Under a compositor nobody knows what shines through.

@@ -256,7 +256,7 @@ WindowTree::Node* WindowTree::NodeOfClient(xcb_window_t client) {
 /// all, or what covers the screen when nobody works: neither is a window of anybody's, and there is nothing
 /// else of that kind.
 bool WindowTree::IsOfServer(xcb_window_t window) const {
-    return (window & ~xcb_get_setup(m_connection.Get())->resource_id_mask) == 0;
+    return (window & ~m_connection.Setup().resource_id_mask) == 0;
 }
 
 WindowTree::Node& WindowTree::Add(xcb_window_t window) {

@@ -184,7 +184,7 @@ void WindowTree::Reader::ApplyLater(Answers& answers) {
 
 /// The client that has made a window, by the part of the name that the server gives each client.
 std::uint32_t WindowTree::Reader::MakerOf(xcb_window_t window) const {
-    return window & ~xcb_get_setup(m_connection.Get())->resource_id_mask;
+    return window & ~m_connection.Setup().resource_id_mask;
 }
 
 pid_t WindowTree::Reader::OwnerFrom(Answers& answers) {

@@ -55,7 +55,7 @@ X11Connection::X11Connection(Link link, int wakes)
 void* X11Connection::PollReply(unsigned sequence, bool& answered) {
     void* reply = nullptr;
     xcb_generic_error_t* error = nullptr;
-    answered = xcb_poll_for_reply(Get(), sequence, &reply, &error) != 0;
+    answered = xcb_poll_for_reply(m_connection.get(), sequence, &reply, &error) != 0;
     std::free(error);
     if (reply == nullptr)
         Check();
@@ -67,17 +67,19 @@ void* X11Connection::AwaitReply(unsigned sequence) {
     if (sequence == 0)
         return nullptr;
     // Whoever goes away without the reply doesn't want it.
-    Pending<void> pending(Get(), sequence);
+    Pending<void> pending(m_connection.get(), sequence);
     Patience patience(m_deadline, m_wakes);
-    for (bool flushed = false;; flushed = true) {
+    bool sent = m_mayHoldRequests;
+    Flush();
+    for (;; sent = true) {
         bool answered = false;
         void* const reply = PollReply(sequence, answered);
         if (answered) {
             pending.Take();
             return reply;
         }
-        if (!flushed) // of requests that went out together, the first answer has mostly brought the others
-            Flush();
+        if (!sent) // of requests that went out together, the first answer has mostly brought the others
+            Send();
         if (patience.WaitFor(Descriptor(), POLLIN) != Patience::Outcome::Ready)
             throw Unanswered();
     }
@@ -89,17 +91,23 @@ void X11Connection::RoundTrip() {
 
 /// xcb itself waits without end for a server that takes nothing in. So it is given only what there is room
 /// for: a socket that can be written to at all takes more than xcb holds back.
-void X11Connection::Flush() {
+void X11Connection::Send() {
     Patience patience(m_deadline, m_wakes);
     if (patience.WaitFor(Descriptor(), POLLOUT) != Patience::Outcome::Ready)
         throw Unanswered();
-    xcb_flush(Get());
+    xcb_flush(m_connection.get());
+    m_mayHoldRequests = false;
     Check();
+}
+
+void X11Connection::Flush() {
+    if (m_mayHoldRequests)
+        Send();
 }
 
 Event X11Connection::NextEvent() {
     for (;;) {
-        Event event(xcb_poll_for_event(Get()));
+        Event event(xcb_poll_for_event(m_connection.get()));
         if (event == nullptr)
             Check();
         if (event == nullptr || event->response_type != 0)
@@ -109,19 +117,19 @@ Event X11Connection::NextEvent() {
 
 Event X11Connection::NextQueuedEvent() {
     for (;;) {
-        Event event(xcb_poll_for_queued_event(Get()));
+        Event event(xcb_poll_for_queued_event(m_connection.get()));
         if (event == nullptr || event->response_type != 0)
             return event;
     }
 }
 
 void X11Connection::Check() const {
-    if (xcb_connection_has_error(Get()) != 0)
+    if (xcb_connection_has_error(m_connection.get()) != 0)
         throw Lost();
 }
 
 int X11Connection::Descriptor() const {
-    return xcb_get_file_descriptor(Get());
+    return xcb_get_file_descriptor(m_connection.get());
 }
 
 // ---- Ids

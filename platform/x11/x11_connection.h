@@ -99,7 +99,12 @@ public:
     X11Connection(const X11Connection&) = delete;
     X11Connection& operator=(const X11Connection&) = delete;
 
-    xcb_connection_t* Get() const { return m_connection.get(); }
+    /// For requests: whoever has it may have asked for something, until the next Flush or Await.
+    xcb_connection_t* Get() const {
+        m_mayHoldRequests = true;
+        return m_connection.get();
+    }
+    const xcb_setup_t& Setup() const { return *xcb_get_setup(m_connection.get()); }
     const xcb_screen_t& Screen() const { return *m_screen; }
     int ScreenNumber() const { return m_screenNumber; }
     xcb_window_t Root() const { return m_screen->root; }
@@ -142,6 +147,7 @@ public:
 
     /// Waits until the server has done all that was asked so far.
     void RoundTrip();
+    /// Sends what has been asked for since the last time.
     void Flush();
 
     /// Everything that has come, in its order; null when there is nothing more. Reads the socket.
@@ -155,6 +161,7 @@ public:
 
 private:
     void* AwaitReply(unsigned sequence);
+    void Send();
     void AskForFreeIds();
     void LookUpExtensions();
     void LookUpVersions();
@@ -163,6 +170,7 @@ private:
     const XcbConnection m_connection;
     const int m_screenNumber;
     const int m_wakes;
+    mutable bool m_mayHoldRequests = true;
     const xcb_screen_t* m_screen = nullptr;
     Extensions m_extensions;
     std::array<xcb_atom_t, static_cast<std::size_t>(AtomName::Count)> m_atoms{};

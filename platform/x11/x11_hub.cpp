@@ -33,27 +33,67 @@ X11Hub::~X11Hub() {
 
 // ---- Looking
 
-/// As it is when the deadline passes before the first try to connect is over: lost.
-View X11Hub::Look(Nanoseconds deadline) {
-    View lost = m_lost;
-    lost.life.epoch = m_state->Epoch();
-    if (InForkedChild())
-        return lost;
+/// False when there is no view: it is closed, can't be started, or the deadline passes before the first try
+/// to connect is over.
+bool X11Hub::AwaitSettled(Lock& lock, Nanoseconds deadline) {
+    if (m_state->PhaseNow(lock) == Phase::Settled)
+        return !m_state->IsClosed(lock);
     const Nanoseconds end = std::min(deadline, CmSteadyNow() + DEFAULT_CONNECT_DEADLINE);
-    Lock lock = m_state->point.Acquire();
     while (!m_state->IsClosed(lock) && m_state->PhaseNow(lock) != Phase::Settled) {
         if (m_state->PhaseNow(lock) == Phase::AtRest) {
             lock.unlock();
-            if (!StartThread())
-                return lost;
+            const bool isStarted = StartThread();
             lock.lock();
+            if (!isStarted)
+                return false;
         } else if (CmSteadyNow() < end) {
             m_state->point.WaitUntil(lock, end);
         } else {
-            return lost;
+            return false;
         }
     }
-    return m_state->IsClosed(lock) ? lost : m_state->Now(lock);
+    return !m_state->IsClosed(lock);
+}
+
+/// Of the view; where there is none, of a lost one.
+template <class Part>
+auto X11Hub::LookAt(Part part) -> decltype(part(std::declval<const View&>())) {
+    if (!InForkedChild()) {
+        Lock lock = m_state->point.Acquire();
+        if (AwaitSettled(lock, Nanoseconds::max()))
+            return part(m_state->Now(lock));
+    }
+    View lost = m_lost;
+    lost.life.epoch = m_state->Epoch();
+    return part(lost);
+}
+
+View X11Hub::Look() {
+    return LookAt([](const View& view) { return view; });
+}
+
+LifeState X11Hub::Life() {
+    return LookAt([](const View& view) { return view.life; });
+}
+
+Availability X11Hub::Of(Capability capability) {
+    return LookAt([capability](const View& view) { return view.Of(capability); });
+}
+
+std::shared_ptr<const DisplayList> X11Hub::Displays() {
+    return LookAt([](const View& view) { return view.displays; });
+}
+
+std::shared_ptr<const WindowSnapshot> X11Hub::Windows() {
+    return LookAt([](const View& view) { return view.windows; });
+}
+
+std::shared_ptr<const ApplicationList> X11Hub::Applications() {
+    return LookAt([](const View& view) { return view.applications; });
+}
+
+std::shared_ptr<const CursorImage> X11Hub::Cursor() {
+    return LookAt([](const View& view) { return view.cursor; });
 }
 
 /// False when there is none and none can be started. Also true when another one has ended it meanwhile.
@@ -76,8 +116,8 @@ PictureOutcome X11Hub::Run(Nanoseconds deadline, Work work) {
     const auto command = std::make_shared<Command>();
     command->work = std::move(work);
     command->deadline = deadline;
-    Look(deadline);
     Lock lock = m_state->point.Acquire();
+    AwaitSettled(lock, deadline);
     if (m_state->IsLost(lock))
         return PictureOutcome::Lost;
     if (CmSteadyNow() >= deadline)

@@ -4,6 +4,7 @@
 #include "platform/fork_watch.h"
 #include "platform/window_server.h"
 #include "platform/x11/display_streams.h"
+#include "util/cm_clock.h"
 
 #include <array>
 #include <chrono>
@@ -12,6 +13,7 @@
 #include <functional>
 #include <memory>
 #include <string>
+#include <utility>
 
 namespace platform::x11 {
 
@@ -58,7 +60,14 @@ public:
     bool InForkedChild() const { return m_forks.InChild(); }
 
     /// The state now. At rest it starts the thread and waits for it to have connected, or to have failed to.
-    View Look() { return Look(Nanoseconds::max()); }
+    View Look();
+    // Parts of it.
+    LifeState Life();
+    Availability Of(Capability capability);
+    std::shared_ptr<const DisplayList> Displays();
+    std::shared_ptr<const WindowSnapshot> Windows();
+    std::shared_ptr<const ApplicationList> Applications();
+    std::shared_ptr<const CursorImage> Cursor();
 
     /// Runs `work` on the thread and waits for it. Ok when it has run; Lost without a server that answers;
     /// Timeout when the deadline has passed, which makes the server stalled unless it was passed before.
@@ -79,7 +88,9 @@ public:
 private:
     explicit X11Hub(std::string display);
 
-    View Look(Nanoseconds deadline);
+    bool AwaitSettled(CCmWaitPoint::Lock& lock, Nanoseconds deadline);
+    template <class Part>
+    auto LookAt(Part part) -> decltype(part(std::declval<const View&>()));
     bool StartThread();
 
     const ForkWatch m_forks;

@@ -115,10 +115,12 @@ CommandPtr HubState::TakeCommand() {
 }
 
 void HubState::Finish(const CommandPtr& command, PictureOutcome outcome) {
-    const Lock lock = point.Acquire();
-    command->state = Command::State::Done;
-    command->outcome = outcome;
-    point.NotifyAll();
+    {
+        const Lock lock = point.Acquire();
+        command->state = Command::State::Done;
+        command->outcome = outcome;
+    }
+    point.NotifyAll(); // whoever waits finds the lock free
 }
 
 void HubState::OnConnected(View view, bool sameServer) {

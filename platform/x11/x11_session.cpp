@@ -68,7 +68,7 @@ void X11Session::Begin() {
         m_tree.Begin();
     }
     m_pointer.Read();
-    CatchUp();
+    CatchUp(EventsFrom::Socket);
 }
 
 /// A compositor tells that it is there by owning a selection.
@@ -112,8 +112,9 @@ void X11Session::Dispatch(const xcb_generic_event_t& event) {
         m_streams.OnPointerChanged();
 }
 
-void X11Session::Drain() {
-    while (const Event event = m_connection.NextEvent())
+void X11Session::Drain(EventsFrom from) {
+    const bool reads = from == EventsFrom::Socket;
+    while (const Event event = reads ? m_connection.NextEvent() : m_connection.NextQueuedEvent())
         Dispatch(*event);
     NoteGeneration();
 }
@@ -143,7 +144,7 @@ bool X11Session::IsPainted(CGDirectDisplayID display) {
         const int top = CmTruncate(each.bounds.origin.y + origin.y);
         const PixelRect place{left, top, left + CmTruncate(each.bounds.size.width),
                               top + CmTruncate(each.bounds.size.height)};
-        if (!m_storages.ArePainted(place, m_tree, [this] { Drain(); }))
+        if (!m_storages.ArePainted(place, m_tree, [this] { Drain(EventsFrom::Socket); }))
             return false;
     }
     return !m_composited || m_storages.LastPainted() <= CmSteadyNow() - COMPOSITOR_LAG;
@@ -157,10 +158,10 @@ void X11Session::Settle() {
     m_pointer.Settle();
 }
 
-void X11Session::CatchUp() {
+void X11Session::CatchUp(EventsFrom from) {
     // What is waited for brings more events with it, and nobody may sleep while there are any.
     m_unfinished = true;
-    Drain();
+    Drain(from);
     for (int turn = 0; turn < MOST_TURNS && m_unfinished; ++turn) {
         Settle();
         const Event next = m_connection.NextQueuedEvent();
@@ -168,7 +169,7 @@ void X11Session::CatchUp() {
         if (next == nullptr)
             break;
         Dispatch(*next);
-        Drain();
+        Drain(from);
     }
     Publish();
 }
@@ -287,11 +288,13 @@ std::optional<CGPoint> X11Session::PointerPosition() {
 WindowPictureResult X11Session::TakeWindowPicture(const WindowPictureRequest& request) {
     // What was painted before the question has been heard of then, and a server that doesn't answer gives no
     // pictures, not even of what needn't be fetched.
+    m_storages.AskAhead();
     const std::optional<CGPoint> pointer = m_pointer.Position();
-    CatchUp();
-    WindowPictureResult result = m_storages.Take(request, m_tree, InPoints(pointer), [this] { Drain(); });
+    CatchUp(EventsFrom::Answers);
+    WindowPictureResult result =
+        m_storages.Take(request, m_tree, InPoints(pointer), [this] { Drain(EventsFrom::Answers); });
     // Whoever has the picture finds the snapshot that it shows.
-    CatchUp();
+    CatchUp(EventsFrom::Answers);
     return result;
 }
 
@@ -307,7 +310,7 @@ void X11Session::DetachReader(const StreamReaderPtr& reader) {
 }
 
 DisplayPictureResult X11Session::TakeNewest(StreamReader& reader) {
-    CatchUp();
+    CatchUp(EventsFrom::Socket);
     StreamMoment moment;
     const std::shared_ptr<const DisplayList> displays = m_displays.Displays();
     moment.displays = displays.get();
@@ -319,7 +322,7 @@ DisplayPictureResult X11Session::TakeNewest(StreamReader& reader) {
     moment.generationBefore = isKnown ? OldestShown() : 0;
     moment.generation = m_tree.Generation();
     moment.generationAfter = [this] {
-        Drain();
+        Drain(EventsFrom::Socket);
         return m_tree.Generation();
     };
     m_lastTake = CmSteadyNow();
@@ -331,7 +334,7 @@ DisplayPictureResult X11Session::TakeNewest(StreamReader& reader) {
 }
 
 bool X11Session::BringToFront(pid_t pid) {
-    CatchUp();
+    CatchUp(EventsFrom::Socket);
     return ActivateWindowsOf(m_connection, m_tree, pid);
 }
 

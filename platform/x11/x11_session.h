@@ -32,6 +32,12 @@ public:
     virtual void OnStreamPicture(std::uint64_t stream) = 0; ///< StreamReader::id
 };
 
+/// Which events are taken in.
+enum class EventsFrom {
+    Answers, ///< Those that the last answer has brought with it: all that the server sent before it.
+    Socket,  ///< Also what has come since.
+};
+
 /// All that goes on over one connection: events in, look-ups out, pictures on demand.
 /// Threads: the X thread.
 /// Errors:  those of X11Connection; after Unanswered it can go on, after Lost it is to be destroyed.
@@ -46,7 +52,7 @@ public:
     /// Reads everything and tells it.
     void Begin();
     /// Takes in the events that are here and tells what is new.
-    void CatchUp();
+    void CatchUp(EventsFrom from);
     std::optional<std::chrono::nanoseconds> NextDue() const;
     void DoDue();
     /// What else than the connection is to be waited on. When one is readable, DoDue has something to do.
@@ -69,7 +75,7 @@ private:
     void ReadCompositor();
     void SetComposited(bool composited);
     void Dispatch(const xcb_generic_event_t& event);
-    void Drain();
+    void Drain(EventsFrom from);
     void Settle();
     void NoteGeneration();
     void Publish();

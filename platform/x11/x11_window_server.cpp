@@ -35,11 +35,11 @@ const char* X11WindowServer::Name() const {
 }
 
 LifeState X11WindowServer::GetLife() const {
-    return m_hub->Look().life;
+    return m_hub->Life();
 }
 
 Availability X11WindowServer::GetCapability(Capability capability) const {
-    return m_hub->Look().Of(capability);
+    return m_hub->Of(capability);
 }
 
 Permission X11WindowServer::GetPermission() const {
@@ -54,15 +54,15 @@ void X11WindowServer::SetNoticeReceiver(std::shared_ptr<NoticeReceiver> receiver
 }
 
 std::shared_ptr<const DisplayList> X11WindowServer::GetDisplays() const {
-    return m_hub->Look().displays;
+    return m_hub->Displays();
 }
 
 std::shared_ptr<const WindowSnapshot> X11WindowServer::GetWindows() const {
-    return m_hub->Look().windows;
+    return m_hub->Windows();
 }
 
 std::shared_ptr<const ApplicationList> X11WindowServer::GetApplications() const {
-    return m_hub->Look().applications;
+    return m_hub->Applications();
 }
 
 // What runs on the other thread may run when nobody waits any more, so it owns what it writes to.
@@ -81,18 +81,22 @@ bool X11WindowServer::GetPointerPosition(CGPoint& position) const {
 }
 
 std::shared_ptr<const CursorImage> X11WindowServer::GetCursor() const {
-    return m_hub->Look().cursor;
+    return m_hub->Cursor();
 }
 
 WindowPictureResult X11WindowServer::TakeWindowPicture(const WindowPictureRequest& request) {
     WindowPictureResult result;
     CmCallGuarded("[X11WindowServer::TakeWindowPicture]>>exception: ", [&] {
-        const auto taken = std::make_shared<WindowPictureResult>();
-        result.outcome = m_hub->Run(request.deadline, [taken, request](X11Session& session) {
-            *taken = session.TakeWindowPicture(request);
+        struct Taking {
+            const WindowPictureRequest request;
+            WindowPictureResult result;
+        };
+        const auto taking = std::make_shared<Taking>(Taking{request, {}});
+        result.outcome = m_hub->Run(request.deadline, [taking](X11Session& session) {
+            taking->result = session.TakeWindowPicture(taking->request);
         });
         if (result.outcome == PictureOutcome::Ok)
-            result = *taken;
+            result = std::move(taking->result);
     });
     return result;
 }

@@ -198,7 +198,7 @@ void X11Worker::Serve() {
     RunCommands();
     m_connection->SetDeadline(CmSteadyNow() + PATIENCE);
     m_session->DoDue();
-    m_session->CatchUp();
+    m_session->CatchUp(std::exchange(m_isReadable, false) ? EventsFrom::Socket : EventsFrom::Answers);
     m_connection->Flush();
     Wait();
 }
@@ -223,7 +223,7 @@ void X11Worker::ServeStalled() {
         return WaitForServer(sent ? POLLIN : POLLIN | POLLOUT);
     m_asked = false;
     m_connection->SetDeadline(CmSteadyNow() + PATIENCE);
-    m_session->CatchUp();
+    m_session->CatchUp(EventsFrom::Socket);
     m_hub.OnAnswering();
 }
 
@@ -290,8 +290,11 @@ void X11Worker::WaitForServer(short events) {
 
 void X11Worker::WaitFor(std::vector<pollfd>& waits, Nanoseconds longest) {
     const timespec span = SpanOf(longest);
-    ppoll(waits.data(), waits.size(), &span, nullptr);
-    Drain(m_wakes);
+    if (ppoll(waits.data(), waits.size(), &span, nullptr) <= 0)
+        return;
+    m_isReadable = waits[0].revents != 0;
+    if (waits[2].revents != 0)
+        Drain(m_wakes);
 }
 
 // ---- What the session tells

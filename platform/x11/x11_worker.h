@@ -52,6 +52,7 @@ private:
     void RunCommand(const CommandPtr& command);
     void Wait();
     void WaitForServer(short events);
+    /// `waits` begins with those of ServerWaits.
     void WaitFor(std::vector<pollfd>& waits, Nanoseconds longest);
     std::vector<pollfd> ServerWaits(short events) const;
     Nanoseconds TimeToNextDue() const;
@@ -74,6 +75,7 @@ private:
     Milliseconds m_backOff;
     Pending<xcb_get_input_focus_reply_t> m_question; // whether a stalled server answers
     bool m_asked = false;
+    bool m_isReadable = false; // the connection has something that nobody has read
     View m_view;
     bool m_publishes = false; // not before all of a new session is there
 

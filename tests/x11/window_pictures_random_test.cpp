@@ -242,6 +242,13 @@ private:
     PixelRect m_seen{0, 0, WIDTH, HEIGHT};
 };
 
+/// As before each picture of a session.
+void AskAhead(StoragesBench& bench) {
+    bench.Storages().AskAhead();
+    bench.Connection().RoundTrip();
+    bench.CatchUp();
+}
+
 TEST(WindowPicturesRandom, TellAllThatIsDifferentFromEarlierOnes) {
     for (unsigned seed = 1; seed <= 4; ++seed) {
         StoragesBench bench({.width = 800, .height = 600});
@@ -253,6 +260,8 @@ TEST(WindowPicturesRandom, TellAllThatIsDifferentFromEarlierOnes) {
         Reader holder(true);
         for (int step = 0; step < TestRounds(250); ++step) {
             window.Act();
+            if (random() % 2 == 0)
+                AskAhead(bench);
             const PicturePtr picture = bench.TakeOne(window.Id());
             ASSERT_NE(picture, nullptr) << step;
             ASSERT_TRUE(always.Look(picture)) << seed << " " << step;
@@ -321,8 +330,7 @@ TEST(WindowPicturesRandom, TellAllThatIsDifferentWhileSomebodyPaints) {
         {
             Painter painter(bench.Server().Display(), window.Id(), seed);
             for (int step = 0; step < TestRounds(300); ++step) {
-                bench.Connection().RoundTrip();
-                bench.CatchUp();
+                AskAhead(bench);
                 const PicturePtr picture = bench.TakeOne(window.Id());
                 ASSERT_TRUE(light.Look(picture)) << seed << " " << step;
                 if (step % 3 == 0) {

@@ -333,7 +333,7 @@ TEST(WindowStorages, GiveTheSamePictureOfAWindowThatWasMoved) {
     EXPECT_EQ(moved.frame.origin, (CGPoint{100, 90}));
 }
 
-TEST(WindowStorages, FetchTheRowsThatHaveChangedAndNoOthers) {
+TEST(WindowStorages, FetchTheRectanglesThatHaveChangedAndNoOthers) {
     StoragesBench bench;
     bench.Begin();
     const xcb_window_t window = bench.Show(PLACE);
@@ -343,11 +343,61 @@ TEST(WindowStorages, FetchTheRowsThatHaveChangedAndNoOthers) {
     const auto before = bench.Storages().TrafficSoFar();
     const PicturePtr changed = bench.TakeOne(window);
     ASSERT_NE(changed, nullptr);
-    EXPECT_EQ(bench.Storages().TrafficSoFar().bytes - before.bytes, 4U * 200 * 4);
+    EXPECT_EQ(bench.Storages().TrafficSoFar().bytes - before.bytes, 7U * 4 * 4);
     EXPECT_EQ(CountOf(*changed, BLUE), 7 * 4);
     EXPECT_EQ(PixelAt(*changed, 13, 17), BLUE);
     EXPECT_EQ(PixelAt(*changed, 19, 20), BLUE);
     EXPECT_EQ(CountOf(*changed, GREEN), AREA - 28);
+}
+
+TEST(WindowStorages, FetchRectanglesThatAreFarApartEachOnItsOwn) {
+    StoragesBench bench;
+    bench.Begin();
+    const xcb_window_t window = bench.Show({0, 0, 1000, 600});
+    const PicturePtr first = bench.TakeOne(window);
+    ASSERT_TRUE(IsAll(first, GREEN));
+    const std::vector<PixelRect> painted{{10, 10, 20, 20}, {900, 300, 950, 310}, {0, 590, 900, 600}};
+    PixelRegion all;
+    for (const PixelRect& rect : painted) {
+        bench.Fill(window, 0x0000FF, rect);
+        all.Add(rect);
+    }
+    bench.Settle();
+    const auto before = bench.Storages().TrafficSoFar();
+    const PicturePtr changed = bench.TakeOne(window);
+    ASSERT_NE(changed, nullptr);
+    EXPECT_EQ(CountOf(*changed, BLUE), 100 + 500 + 9000);
+    EXPECT_EQ(CountOf(*first, BLUE), 0);
+    EXPECT_EQ(ChangesSince(*changed, first->serial), all);
+    // What is nearly as wide as the window is read as whole rows.
+    EXPECT_EQ(bench.Storages().TrafficSoFar().bytes - before.bytes, (100U + 500 + 10000) * 4);
+}
+
+TEST(WindowStorages, LearnOfChangesWithAnAnswerThatTheyWaitForAnyway) {
+    StoragesBench bench;
+    bench.Begin();
+    const xcb_window_t window = bench.Show(PLACE);
+    ASSERT_TRUE(IsAll(bench.TakeOne(window), GREEN));
+    for (const int row : {0, 20, 40}) {
+        bench.Fill(window, 0x0000FF, {0, row, 10, row + 10});
+        bench.Settle();
+        bench.Storages().AskAhead();
+        bench.Storages().AskAhead();
+        bench.Fill(window, 0x0000FF, {0, row + 10, 10, row + 20}); // is told later
+        bench.Settle();
+        const PicturePtr picture = bench.TakeOne(window);
+        ASSERT_NE(picture, nullptr);
+        EXPECT_EQ(CountOf(*picture, BLUE), 10 * (row + 20));
+    }
+    // Nobody takes a picture of what was asked about.
+    bench.Fill(window, 0x00FF00, {0, 0, 200, 100});
+    bench.Settle();
+    bench.Storages().AskAhead();
+    bench.Settle();
+    bench.Move(window, 90, 90);
+    bench.Settle();
+    bench.Storages().AskAhead();
+    EXPECT_TRUE(IsAll(bench.TakeOne(window), GREEN));
 }
 
 TEST(WindowStorages, NumberPicturesAndTellHowTheyCameOutOfEarlierOnes) {
