@@ -1,6 +1,7 @@
 // SPDX-License-Identifier: Apache-2.0
 #include "platform/bitmap_context.h"
 
+#include "platform/bitmap_context_clip.h"
 #include "platform/image_scaler.h"
 #include "platform/pixel_rows.h"
 #include "util/cm_numeric.h"
@@ -16,25 +17,6 @@
 #include <vector>
 
 namespace platform {
-
-namespace {
-
-/// Whole pixels from the top left corner; right and bottom exclusive. Wide enough for any two ends of 32
-/// bits.
-struct PixelBox {
-    std::int64_t left = 0;
-    std::int64_t top = 0;
-    std::int64_t right = 0;
-    std::int64_t bottom = 0;
-
-    std::int64_t Width() const { return right - left; }
-    std::int64_t Height() const { return bottom - top; }
-    bool IsEmpty() const { return left >= right || top >= bottom; }
-
-    bool operator==(const PixelBox&) const = default;
-};
-
-} // namespace
 
 /// The pixels of a context, in the order of its memory: row 0 at the top.
 class CGContext {
@@ -103,9 +85,7 @@ PixelBox BoxOf(const CGContext& context, const CGRect& rect) {
 }
 
 PixelBox Clip(const CGContext& context, const PixelBox& box) {
-    const PixelBox& within = context.clip;
-    return {std::max(box.left, within.left), std::max(box.top, within.top), std::min(box.right, within.right),
-            std::min(box.bottom, within.bottom)};
+    return CommonBox(box, context.clip);
 }
 
 bool IsFinite(const CGRect& rect) {
@@ -330,6 +310,24 @@ void CGContextClipToRect(CGContext* context, const CGRect& rect) noexcept {
 void CGContextResetClip(CGContext* context) noexcept {
     if (context != nullptr)
         context->clip = {0, 0, context->width, context->height};
+}
+
+PixelBox CommonBox(const PixelBox& one, const PixelBox& other) noexcept {
+    return {std::max(one.left, other.left), std::max(one.top, other.top), std::min(one.right, other.right),
+            std::min(one.bottom, other.bottom)};
+}
+
+PixelBox CGContextBoxOf(const CGContext* context, const CGRect& rect) noexcept {
+    return context != nullptr ? BoxOf(*context, rect) : PixelBox{};
+}
+
+PixelBox CGContextGetClip(const CGContext* context) noexcept {
+    return context != nullptr ? context->clip : PixelBox{};
+}
+
+void CGContextSetClip(CGContext* context, const PixelBox& clip) noexcept {
+    if (context != nullptr)
+        context->clip = CommonBox(clip, {0, 0, context->width, context->height});
 }
 
 void CGContextFillRect(CGContext* context, const CGRect& rect) noexcept {

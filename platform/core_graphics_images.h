@@ -6,6 +6,7 @@
 #include "platform/core_types.h"
 
 #include <memory>
+#include <optional>
 #include <span>
 
 /// Images of chosen windows, put together from the windows' own pictures: what lies in front of them, behind
@@ -35,12 +36,20 @@ CGWindowImageRef CGWindowListTakeImage(const CGRect& rect, std::span<const CGWin
 int CGWindowImageGetWidth(const CGWindowImage* image) noexcept;
 int CGWindowImageGetHeight(const CGWindowImage* image) noexcept;
 
+/// Where the pointer was when it was taken, in global points, if the window server has told; nothing for
+/// null.
+std::optional<CGPoint> CGWindowImageGetPointer(const CGWindowImage* image) noexcept;
+
 /// Whether drawing it leaves nothing of what was there before. False for null.
 bool CGWindowImageIsOpaque(const CGWindowImage* image) noexcept;
 
 /// Draws it into `rect` as one image would be drawn, and nothing outside of it. What the windows don't cover
-/// stays. False when memory ran out and something may be missing.
+/// stays. The context's clip is as before afterwards. False when memory ran out and something may be missing.
 bool CGContextDrawWindowImage(CGContext* context, const CGRect& rect, const CGWindowImage* image) noexcept;
+
+/// Whether drawing it into `rect` leaves nothing of what is where the context can be painted on now. False
+/// for null.
+bool CGContextIsCovered(const CGContext* context, const CGRect& rect, const CGWindowImage* image) noexcept;
 
 /// In one block, transparent where nothing is. A window that fills it is not copied. Null for null and when
 /// memory runs out.

@@ -143,6 +143,7 @@ void Desk::SetLie(SimulatedLie lie, bool tells) {
     else
         m_lies.erase(lie);
     m_painter.KeepOldPixels(Tells(SimulatedLie::OldPixelsKept));
+    m_painter.ForgetChanges(Tells(SimulatedLie::ChangesForgotten));
     Settle();
 }
 

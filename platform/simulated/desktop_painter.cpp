@@ -1,10 +1,12 @@
 // SPDX-License-Identifier: Apache-2.0
 #include "platform/simulated/desktop_painter.h"
 
+#include "platform/picture_changes.h"
 #include "util/cm_numeric.h"
 
 #include <algorithm>
 #include <cmath>
+#include <cstddef>
 #include <memory>
 #include <utility>
 
@@ -63,6 +65,12 @@ const SimulatedCursor::Representation& BestFor(const SimulatedCursor& cursor, fl
         });
 }
 
+bool IsOfShape(const Picture& picture, const SimulatedPixels& pixels, const SimulatedPictureShape& shape) {
+    return picture.width == pixels.width && picture.height == pixels.height &&
+           picture.format == shape.format && picture.scale == shape.scale &&
+           picture.stride == static_cast<std::size_t>(pixels.width) * 4 + shape.rowGap;
+}
+
 } // namespace
 
 CGRect WithShadow(const SimulatedWindow& window) {
@@ -87,11 +95,29 @@ PicturePtr DesktopPainter::WindowPicture(const Moment& moment, const SimulatedWi
     Painted* const painted = PaintedWindow(moment, window, withShadow);
     if (painted == nullptr)
         return nullptr;
-    if (painted->picture == nullptr) {
-        painted->picture =
-            std::make_shared<const Picture>(MakePicture(*painted->pixels, painted->source.shape, moment.now));
+    return PictureOf(painted->pixels, painted->source.shape, moment.now, painted->pictured);
+}
+
+/// The same object as long as the pixels and how they lie are the same.
+PicturePtr DesktopPainter::PictureOf(const SimulatedPixelsPtr& pixels, const SimulatedPictureShape& shape,
+                                     std::chrono::nanoseconds now, Pictured& pictured) const {
+    const Picture* const before = pictured.picture.get();
+    const bool isAlike = before != nullptr && IsOfShape(*before, *pixels, shape);
+    if (isAlike && pictured.pixels == pixels)
+        return pictured.picture;
+    auto picture = std::make_shared<Picture>(MakePicture(*pixels, shape, now));
+    picture->serial = NextPictureSerial();
+    if (isAlike) {
+        std::vector<PixelRect> rects = DifferentRects(*pictured.pixels, *pixels);
+        if (m_forgetChanges && !rects.empty())
+            rects.pop_back();
+        PixelRegion changed;
+        for (const PixelRect& rect : rects)
+            changed.Add(rect);
+        picture->steps = StepsAfter(*before, changed);
     }
-    return painted->picture;
+    pictured = {pixels, std::move(picture)};
+    return pictured.picture;
 }
 
 SimulatedPixelsPtr DesktopPainter::DisplayPixels(const Moment& moment, const SimulatedDisplay& display,
@@ -110,14 +136,9 @@ SimulatedPixelsPtr DesktopPainter::DisplayPixels(const Moment& moment, const Sim
 }
 
 PicturePtr DesktopPainter::DisplayPicture(const Moment& moment, const SimulatedDisplay& display) {
-    SimulatedPixelsPtr pixels = DisplayPixels(moment, display, false);
-    auto& [shown, picture] = m_displayPictures[display.id];
-    if (picture == nullptr || shown != pixels) {
-        picture = std::make_shared<const Picture>(MakePicture(
-            *pixels, {display.format, display.rowGap, display.bounds, display.scale}, moment.now));
-        shown = std::move(pixels);
-    }
-    return picture;
+    const SimulatedPixelsPtr pixels = DisplayPixels(moment, display, false);
+    return PictureOf(pixels, {display.format, display.rowGap, display.bounds, display.scale}, moment.now,
+                     m_displayPictures[display.id]);
 }
 
 void DesktopPainter::Forget(const SimulatedDesktop& desktop) {
@@ -178,13 +199,8 @@ DesktopPainter::Painted* DesktopPainter::PaintedWindow(const Moment& moment, con
         return &known->second;
     auto pixels = std::make_shared<const SimulatedPixels>(Paint(source));
     Painted& painted = m_windows[{window.info.id, withShadow}];
-    const Source& before = painted.source;
-    if (painted.pixels == nullptr || *painted.pixels != *pixels ||
-        before.shape.format != source.shape.format || before.shape.rowGap != source.shape.rowGap ||
-        before.shape.scale != source.shape.scale) {
+    if (painted.pixels == nullptr || *painted.pixels != *pixels)
         painted.pixels = std::move(pixels);
-        painted.picture = nullptr;
-    }
     painted.source = std::move(source);
     return &painted;
 }

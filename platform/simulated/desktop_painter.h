@@ -36,6 +36,9 @@ public:
     /// Gives the pictures that it has instead of newer ones.
     void KeepOldPixels(bool keep) { m_keepOld = keep; }
 
+    /// Leaves the last rectangle out of what made a picture different from the one before.
+    void ForgetChanges(bool forget) { m_forgetChanges = forget; }
+
     /// Lets go of windows and displays that are gone.
     void Forget(const SimulatedDesktop& desktop);
 
@@ -52,14 +55,22 @@ private:
         bool SameAs(const Source& other) const;
     };
 
+    /// The last picture that was made of pixels that change.
+    struct Pictured {
+        SimulatedPixelsPtr pixels;
+        PicturePtr picture;
+    };
+
     struct Painted {
         Source source;
         SimulatedPixelsPtr pixels;
-        PicturePtr picture; // made when first asked for
+        Pictured pictured; // no newer than the pixels
     };
 
     static Source SourceOf(const Moment& moment, const SimulatedWindow& window, bool withShadow);
     static SimulatedPixels Paint(const Source& source);
+    PicturePtr PictureOf(const SimulatedPixelsPtr& pixels, const SimulatedPictureShape& shape,
+                         std::chrono::nanoseconds now, Pictured& pictured) const;
     Painted* PaintedWindow(const Moment& moment, const SimulatedWindow& window, bool withShadow);
     SimulatedPixelsPtr Background(const Moment& moment, const SimulatedDisplay& display);
     void LayWindow(const Moment& moment, const SimulatedWindow& window, const SimulatedDisplay& display,
@@ -69,8 +80,9 @@ private:
     std::map<std::pair<CGWindowID, bool>, Painted> m_windows; // by window and shadow
     std::map<CGDirectDisplayID, Painted> m_backgrounds;
     std::map<std::pair<CGDirectDisplayID, bool>, SimulatedPixelsPtr> m_displays; // by display and pointer
-    std::map<CGDirectDisplayID, std::pair<SimulatedPixelsPtr, PicturePtr>> m_displayPictures;
+    std::map<CGDirectDisplayID, Pictured> m_displayPictures;
     bool m_keepOld = false;
+    bool m_forgetChanges = false;
 };
 
 /// The frame with what is drawn around it.

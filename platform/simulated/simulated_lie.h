@@ -12,7 +12,7 @@ enum class SimulatedLie {
     StaleList,        ///< A new snapshot has a new generation and the windows of the one before.
     OldPixelsKept,    ///< A picture that was made once is given out ever after.
     WrongRectangle,   ///< A layer is told to lie 3 points right of and 2 below its place.
-    ChangesForgotten, ///< A stream leaves out a part of what is different.
+    ChangesForgotten, ///< A stream, or a step of a window's picture, leaves out a part of what is different.
     EndToldTwice,     ///< The end of an application is told twice.
 };
 
