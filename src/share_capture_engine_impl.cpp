@@ -16,6 +16,7 @@ namespace {
 IShareFrame* NewFrame() {
     auto* frame = new CShareFrame;
     frame->AddRef();
+    frame->AllowNote(); // sinks only read
     return frame;
 }
 

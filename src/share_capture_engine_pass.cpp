@@ -29,6 +29,31 @@ bool IsSameData(IShareFrame& a, IShareFrame& b) {
     return ownA != nullptr && ownB != nullptr && ownA->HasSameData(*ownB);
 }
 
+/// While a capturer has the frame. Its note is believed only if the capturer is one of ours and has put it
+/// there itself: others may write what they like, and our own ones may be inside theirs.
+class FillingGuard {
+public:
+    FillingGuard(IShareFrame& frame, bool isOwnCapturer)
+        : m_frame(dynamic_cast<CShareFrame*>(&frame)),
+          m_isOwnCapturer(isOwnCapturer) {
+        if (m_frame != nullptr)
+            m_frame->BeginFilling();
+    }
+    ~FillingGuard() {
+        if (m_frame == nullptr)
+            return;
+        m_frame->EndFilling();
+        if (!m_isOwnCapturer)
+            CShareFrame::DropNoteOf(*m_frame);
+    }
+    FillingGuard(const FillingGuard&) = delete;
+    FillingGuard& operator=(const FillingGuard&) = delete;
+
+private:
+    CShareFrame* const m_frame;
+    const bool m_isOwnCapturer;
+};
+
 } // namespace
 
 unsigned ShareTickNow() {
@@ -150,6 +175,8 @@ bool CShareCaptureEngine::_CaptureStep(Pass& pass) {
 }
 
 int CShareCaptureEngine::_CaptureFrame(IShareCapturer& capturer, IShareFrame* frame) {
+    const FillingGuard filling(*frame,
+                               m_eSHARE_CAPTURE_ENGINE_TYPE != SHARE_CAPTURE_ENGINE_TYPE_USER_CUSTOMIZATION);
     ShareDumpTimeUsage usage;
     int result = SHARE_CAPTURE_FAILED;
     try {

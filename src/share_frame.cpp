@@ -51,6 +51,7 @@ bool CShareFrame::_ExpandFrameData() {
     }
     // The old memory goes first: a large picture is never held twice, and an allocation that throws leaves
     // a frame without pixels and not one with freed ones.
+    _DropNote();
     m_pOwnBuf.reset();
     m_nBufLen = 0;
     m_pOwnBuf = std::make_unique<unsigned char[]>(static_cast<std::size_t>(needed));
@@ -74,6 +75,7 @@ int CShareFrame::_GetFrameDataLen() const {
 
 int CShareFrame::SetExternalBuf(unsigned char* buf, int len) {
     if (buf == nullptr && m_pExternalBuf != nullptr) {
+        _DropNote();
         m_pExternalBuf = nullptr;
         _ExpandFrameData();
         return 0;
@@ -81,6 +83,7 @@ int CShareFrame::SetExternalBuf(unsigned char* buf, int len) {
     if (len < 1 || buf == m_pOwnBuf.get()) {
         return -1;
     }
+    _DropNote();
     m_pOwnBuf.reset();
     m_pExternalBuf = buf;
     m_nBufLen = len;
@@ -104,6 +107,7 @@ int CShareFrame::SetFrameLineBytes(int bytes) {
     if (!_CanSetExternalLineLen() || bytes < 1 || bytes < WrappingProduct(m_nWidth, MIN_BYTES_PER_PIXEL)) {
         return -1;
     }
+    _DropNote();
     m_nLineBytes = bytes;
     _ExpandFrameData();
     return 0;
@@ -111,6 +115,9 @@ int CShareFrame::SetFrameLineBytes(int bytes) {
 
 SHARE_FRAME_FORMAT CShareFrame::SetFrameDataFormat(SHARE_FRAME_FORMAT format) {
     if (format >= SHARE_FRAME_FORMAT_NONE && format <= SHARE_FRAME_FORMAT_BGR) {
+        if (m_eFormat != format) {
+            _DropNote();
+        }
         m_eFormat = format;
         _ExpandFrameData();
     }
@@ -124,8 +131,12 @@ int CShareFrame::GetFrameSize(int& width, int& height) {
 }
 
 int CShareFrame::SetFrameSize(int width, int height) {
+    const TVLSize before{m_nWidth, m_nHeight};
     m_nWidth = std::max(width, 0);
     m_nHeight = std::max(height, 0);
+    if (before != TVLSize{m_nWidth, m_nHeight}) {
+        _DropNote();
+    }
     _ExpandFrameData();
     return 0;
 }
@@ -139,6 +150,7 @@ int CShareFrame::WriteFrameData(const unsigned char* data, int len) {
     if (len < 0 || len > _GetFrameDataLen() || _ExceedsOwnBuf(len)) {
         return 0;
     }
+    _DropNote();
     std::memmove(buffer, data, static_cast<std::size_t>(len));
     return len;
 }
@@ -191,6 +203,9 @@ int CShareFrame::_FrameAreaDataIO(TVLRect rect, unsigned char* data, int len, bo
         return 0;
     }
 
+    if (!bRead) {
+        _DropNote();
+    }
     const std::int64_t leftBytes = rect.left * bytesPerPixel;
     std::int64_t moved = 0;
     for (std::int64_t y = rect.top; y < rect.bottom; ++y) {
@@ -216,6 +231,7 @@ int CShareFrame::CopyIShareFrame(IShareFrame* source) {
     if (source == nullptr) {
         return -2;
     }
+    _DropNote();
     TVLSize size{};
     source->GetFrameSize(size);
     SetFrameSize(size);
@@ -248,6 +264,9 @@ bool CShareFrame::HasSameData(CShareFrame& other) {
     if (_GetFrameDataLen() != other._GetFrameDataLen() || len != other._GetBackedDataLen()) {
         return false;
     }
+    if (m_pNote != nullptr && other.m_pNote != nullptr && m_pNote->IsSameAs(*other.m_pNote)) {
+        return true;
+    }
     const unsigned char* const data = _BufferInForce();
     const unsigned char* const otherData = other._BufferInForce();
     if (len <= 0 || data == nullptr || otherData == nullptr) {
@@ -274,4 +293,38 @@ void CShareFrame::_SwapFields(CShareFrame& other) {
     std::swap(m_eFormat, other.m_eFormat);
     std::swap(m_nTimestamp, other.m_nTimestamp);
     std::swap(m_metaInfo, other.m_metaInfo);
+    _SwapNotes(other);
+}
+
+// ---- The note
+
+/// It goes with the pixels, unless they go where somebody else may write to them.
+void CShareFrame::_SwapNotes(CShareFrame& other) {
+    std::swap(m_pNote, other.m_pNote);
+    std::swap(m_bNoteIsOfThisFilling, other.m_bNoteIsOfThisFilling);
+    if (!m_bAllowsNote || !other.m_bAllowsNote) {
+        _DropNote();
+        other._DropNote();
+    }
+}
+
+std::unique_ptr<ShareFrameNote> CShareFrame::TakeNote() {
+    return std::move(m_pNote);
+}
+
+void CShareFrame::PutNote(std::unique_ptr<ShareFrameNote> note) {
+    m_pNote = AllowsNote() ? std::move(note) : nullptr;
+    m_bNoteIsOfThisFilling = true;
+}
+
+void CShareFrame::DropNoteOf(IShareFrame& frame) {
+    if (auto* const ours = dynamic_cast<CShareFrame*>(&frame)) {
+        ours->_DropNote();
+    }
+}
+
+void CShareFrame::EndFilling() {
+    if (!m_bNoteIsOfThisFilling) {
+        _DropNote();
+    }
 }

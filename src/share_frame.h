@@ -1,6 +1,7 @@
 // SPDX-License-Identifier: Apache-2.0
 #pragma once
 
+#include "src/share_frame_note.h"
 #include "util/qvn_unknown_impl.h"
 
 #include <screenshare/share_frame.h>
@@ -56,15 +57,39 @@ public:
 
     int CopyIShareFrame(IShareFrame* source) override;
     int SwapOrCopy(IShareFrame* other) override;
-    void Reset() override { m_nLineBytes = 0; }
+    void Reset() override {
+        m_nLineBytes = 0;
+        _DropNote();
+    }
 
     /// Whether both have the same data length and the same pixels. Compares no more than there is: after a
-    /// Reset the geometry of a frame may ask for more than its memory holds.
+    /// Reset the geometry of a frame may ask for more than its memory holds. Notes that are the same save the
+    /// comparison.
     bool HasSameData(CShareFrame& other);
 
     /// How much of its data length a frame has memory for, in bytes: after a Reset that may be less than all.
     /// Others than ours answer for their figures.
     static int BackedDataLen(IShareFrame& frame);
+
+    // ---- The note on what the pixels show
+    //
+    // A frame keeps one only if AllowNote has been called: whoever does that answers for it that nobody
+    // writes to the pixels without the frame knowing. Everything here that changes the memory, its pixels or
+    // how they lie drops the note. Who writes by way of the address calls DropNoteOf before.
+
+    void AllowNote() { m_bAllowsNote = true; }
+    bool AllowsNote() const { return m_bAllowsNote && m_pExternalBuf == nullptr; }
+    bool HasNote() const { return m_pNote != nullptr; }
+    /// Null when nothing is known of the pixels. The frame has none any more.
+    std::unique_ptr<ShareFrameNote> TakeNote();
+    /// To be called when all pixels are as `note` says. Given up by a frame that doesn't keep any.
+    void PutNote(std::unique_ptr<ShareFrameNote> note);
+    /// Of any frame, of ours or not.
+    static void DropNoteOf(IShareFrame& frame);
+
+    /// Between these two somebody fills the frame. A note that he hasn't put there is none of his pixels.
+    void BeginFilling() { m_bNoteIsOfThisFilling = false; }
+    void EndFilling();
 
     void SetMetaInfo(const MetaInfo& info) override { m_metaInfo = info; }
     MetaInfo GetMetaInfo() const override { return m_metaInfo; }
@@ -83,6 +108,8 @@ private:
     int _GetBackedDataLen() const;
     bool _ExceedsOwnBuf(int len) const { return m_pOwnBuf != nullptr && len > m_nBufLen; }
     void _SwapFields(CShareFrame& other);
+    void _SwapNotes(CShareFrame& other);
+    void _DropNote() { m_pNote.reset(); }
 
     /// Moves a rectangle between the frame and the dense rows of `data`, which is only read unless `bRead`.
     int _FrameAreaDataIO(TVLRect rect, unsigned char* data, int len, bool bRead);
@@ -99,4 +126,7 @@ private:
     SHARE_FRAME_FORMAT m_eFormat = SHARE_FRAME_FORMAT_NONE;
     std::uint32_t m_nTimestamp = 0;
     MetaInfo m_metaInfo{};
+    std::unique_ptr<ShareFrameNote> m_pNote;
+    bool m_bAllowsNote = false;
+    bool m_bNoteIsOfThisFilling = false;
 };

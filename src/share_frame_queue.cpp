@@ -23,8 +23,11 @@ ShareFrameQueue::ShareFrameQueue(std::size_t capacity) {
     m_captured_frames.reserve(capacity);
     std::vector<ShareRef<IShareFrame>> frames;
     frames.reserve(capacity);
-    for (std::size_t i = 0; i < capacity; ++i)
-        frames.emplace_back(new CShareFrame);
+    for (std::size_t i = 0; i < capacity; ++i) {
+        auto* const frame = new CShareFrame;
+        frames.emplace_back(frame);
+        frame->AllowNote(); // only the library writes to frames of a queue
+    }
     for (const ShareRef<IShareFrame>& frame : frames) {
         frame.Get()->AddRef();
         m_free_frames.push_back(frame.Get());

@@ -170,6 +170,7 @@ bool TvlGraphicUtil::TvlAlphaBlend(IShareFrame* dst, int x, int y, IShareFrame* 
     if (!Touches(dstSize, x, y, srcSize))
         return false;
 
+    CShareFrame::DropNoteOf(*dst);
     const platform::CGContextRef dstContext = ContextOver(*dst, dstSize);
     const platform::CGContextRef srcContext = ContextOver(*src, srcSize);
     const platform::CGImageRef picture = platform::CGBitmapContextCreateImage(srcContext.get());

@@ -7,7 +7,9 @@
 /// A picture: a geometry, one block of pixels, a timestamp and a little meta information.
 ///
 /// Threads:   one thread at a time; only the reference count is atomic. A frame that a sink receives may be
-///            read during that call and no longer.
+///            read during that call and no longer. It is not to be written to by way of GetFrameData and
+///            GetFrameLineData, not even then: only what is different is drawn into it the next time. Whoever
+///            has pixels to change swaps or copies them into a frame of his own.
 /// Lifetime:  by reference count, see qvn::IQvnUnknown.
 /// Units:     pixels for sizes and rectangles, bytes for lengths.
 /// Alpha:     premultiplied wherever a frame with alpha is turned into an image.

@@ -7,11 +7,18 @@
 
 #include <screenshare/share_types.h>
 
+#include <optional>
 #include <string>
 #include <vector>
 
 class IShareFrame;
 class TVLRegion;
+
+/// A cursor on its way into a bitmap context.
+struct ShareCursorDrawing {
+    platform::CGImageRef image; // the same object as long as the pixels are the same
+    platform::CGRect rect;      // where all of it goes, in the space of the context
+};
 
 /// What the platform-bound classes ask the window server in one breath.
 /// Units: global points. Threads: any; nothing is kept. Errors: nothing throws but for want of memory; a
@@ -50,9 +57,13 @@ public:
     /// empty region and for a frame with too little memory.
     static int FillFrame(IShareFrame* frame, int colour, const TVLRegion* region);
 
-    /// Draws the cursor on screen with its hot spot at `position`, in pixels from the top left, `scale`
-    /// pixels for each of its points. False without a context and without a cursor; both are traced now and
-    /// then.
+    /// How the cursor on screen is drawn with its hot spot at `position`, in pixels from the top left,
+    /// `scale` pixels for each of its points. Nothing without a context and without a cursor; both are traced
+    /// now and then.
+    static std::optional<ShareCursorDrawing> FindCursor(const platform::CGContext* context,
+                                                        platform::CGPoint position, float scale);
+
+    /// Finds and draws it. False where there is nothing to be found.
     static bool CaptureCursorToCGContext(platform::CGContext* context, platform::CGPoint position,
                                          float scale);
 

@@ -91,6 +91,7 @@ int ShareUtilMac::FillFrame(IShareFrame* frame, int colour, const TVLRegion* reg
     if (rects.empty())
         return SHARE_RESULT_FAILED;
 
+    CShareFrame::DropNoteOf(*frame);
     const platform::CGContextRef context = ContextOver(*frame, size);
     if (context == nullptr)
         return SHARE_RESULT_FAILED;
@@ -104,20 +105,20 @@ int ShareUtilMac::FillFrame(IShareFrame* frame, int colour, const TVLRegion* reg
     return SHARE_RESULT_OK;
 }
 
-bool ShareUtilMac::CaptureCursorToCGContext(platform::CGContext* context, platform::CGPoint position,
-                                            float scale) {
+std::optional<ShareCursorDrawing> ShareUtilMac::FindCursor(const platform::CGContext* context,
+                                                           platform::CGPoint position, float scale) {
     if (context == nullptr) {
         static CCmRepeatedTraceSite site(CURSOR_TRACE_PERIOD);
         if (site.Due())
             CmTraceError("CaptureCursorToCGContext cgContextRef is nil");
-        return false;
+        return std::nullopt;
     }
     const std::optional<platform::NSCursor> cursor = platform::NSCursor::currentSystemCursor();
     if (!cursor) {
         static CCmRepeatedTraceSite site(CURSOR_TRACE_PERIOD);
         if (site.Due())
             CmTraceError("CaptureCursorToCGContext sysCursor is nil");
-        return false;
+        return std::nullopt;
     }
     const CursorPicture picture = ChooseRepresentation(*cursor->image(), scale);
     const auto height = static_cast<float>(platform::CGBitmapContextGetHeight(context));
@@ -126,8 +127,15 @@ bool ShareUtilMac::CaptureCursorToCGContext(platform::CGContext* context, platfo
     const float top = height - (position.y - cursor->hotSpot().y * scale);
     const platform::CGSize drawn{picture.size.width * picture.drawScale,
                                  picture.size.height * picture.drawScale};
-    platform::CGContextDrawImage(context, {{x, top - drawn.height}, drawn}, picture.image.get());
-    return true;
+    return ShareCursorDrawing{picture.image, {{x, top - drawn.height}, drawn}};
+}
+
+bool ShareUtilMac::CaptureCursorToCGContext(platform::CGContext* context, platform::CGPoint position,
+                                            float scale) {
+    const std::optional<ShareCursorDrawing> cursor = FindCursor(context, position, scale);
+    if (cursor)
+        platform::CGContextDrawImage(context, cursor->rect, cursor->image.get());
+    return cursor.has_value();
 }
 
 bool ShareUtilMac::CGImageWriteToFile(const platform::CGImageRef& image, const char* path) {

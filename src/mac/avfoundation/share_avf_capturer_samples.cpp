@@ -59,6 +59,7 @@ void WriteFrame(IShareFrame& frame, const OpenPicture& picture, const std::uint8
     frame.SetFrameDataFormat(SHARE_FRAME_FORMAT_ARGB);
     frame.SetFrameLineBytes(static_cast<int>(rowBytes));
     frame.SetTimestamp(ShareUtil::GetCaptureFrameTimeStamp());
+    CShareFrame::DropNoteOf(frame);
     // Memory that was attached to the frame doesn't grow with it.
     const std::size_t length =
         std::min(static_cast<std::size_t>(CShareFrame::BackedDataLen(frame)), rowBytes * height);

@@ -22,8 +22,9 @@ namespace {
 
 constexpr int SHADOW_WIDTH = 25; // on a display of scale 1
 
-/// The frame's pixels as a bitmap; null when there is no memory for one.
+/// The frame's pixels as a bitmap to draw on; null when there is no memory for one.
 platform::CGContextRef ContextOn(IShareFrame& frame) {
+    CShareFrame::DropNoteOf(frame);
     TVLSize size{};
     frame.GetFrameSize(size);
     const auto length = static_cast<std::size_t>(CShareFrame::BackedDataLen(frame));
