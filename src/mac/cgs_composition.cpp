@@ -1,13 +1,17 @@
 // SPDX-License-Identifier: Apache-2.0
 #include "src/mac/cgs_composition.h"
 
+#include "platform/bitmap_context_clip.h"
 #include "platform/core_graphics.h"
+#include "platform/pixel_region.h"
+#include "platform/window_image_drawing.h"
 #include "platform/window_services.h"
 #include "src/app_share_config.h"
 #include "src/mac/monitor_enum_mac.h"
 #include "src/mac/share_util_mac.h"
 #include "src/share_capturer_context.h"
 #include "src/share_dump_time_usage.h"
+#include "src/share_frame.h"
 #include "src/share_util.h"
 #include "util/cm_numeric.h"
 #include "util/cm_trace.h"
@@ -17,12 +21,18 @@
 #include <screenshare/share_graphic_util.h>
 
 #include <algorithm>
+#include <cstddef>
 #include <cstring>
+#include <new>
+#include <optional>
+#include <utility>
 
 namespace {
 
 constexpr int BLACK = 0;
 constexpr int BYTES_PER_PIXEL = 4;
+/// Changes of more rectangles are drawn as the one around them.
+constexpr std::size_t MOST_CHANGED_RECTS = 64;
 
 bool HasArea(const platform::CGRect& rect) {
     return rect.size.width != 0 && rect.size.height != 0;
@@ -71,12 +81,94 @@ struct CShareCGSCapturer::Pass {
     platform::CGRect imageRect; // what the image shows
     platform::CGRect drawRect;  // what the frame shows
     bool isDesktop = true;
+    platform::CGRect place; // where the image goes, counted from the bottom of the frame
+    std::optional<ShareCursorDrawing> pointer;
 
-    /// Whether the image leaves nothing of what the frame held before.
-    bool CoversFrame() const {
-        return platform::CGWindowImageIsOpaque(image.get()) && capture.cx >= bitmap.cx &&
-               capture.cy >= bitmap.cy;
+    int Background() const {
+        return isDesktop ? BLACK : int{AppShareConfig::Instance()->m_nAppShareBackgroundColor};
     }
+    /// Whether the image leaves nothing of what is where the context can be painted on now.
+    bool CoversClip(const platform::CGContext* context) const {
+        return platform::CGContextIsCovered(context, place, image.get());
+    }
+};
+
+// ---- What a frame shows
+
+class CShareCGSCapturer::Note final : public ShareFrameNote {
+public:
+    bool IsSameAs(const ShareFrameNote& other) const override {
+        const auto* const note = dynamic_cast<const Note*>(&other);
+        return note != nullptr && IsSameGround(*note) && m_drawing == note->m_drawing &&
+               m_pointer == note->m_pointer;
+    }
+
+    /// False when it can't be told.
+    bool Describe(const Pass& pass, const platform::CGContext* context) {
+        m_size = pass.bitmap;
+        m_background.reset();
+        if (!pass.CoversClip(context))
+            m_background = pass.Background();
+        m_pointer = {};
+        if (pass.pointer)
+            m_pointer = {pass.pointer->image, pass.pointer->rect,
+                         platform::CommonBox(platform::CGContextBoxOf(context, pass.pointer->rect),
+                                             platform::CGContextGetClip(context))};
+        m_drawing.Clear();
+        return context != nullptr &&
+               (pass.image == nullptr || m_drawing.Describe(context, pass.place, pass.image.get()));
+    }
+
+    /// The pixels that are different from an earlier picture, and can be drawn without the others. Nothing
+    /// when all have to be drawn.
+    std::optional<platform::PixelRegion> ChangesSince(const Note& before,
+                                                      const platform::CGWindowImage* image) const {
+        platform::PixelRegion changes;
+        if (!IsSameGround(before) || !m_drawing.AddChanges(before.m_drawing, image, changes))
+            return std::nullopt;
+        if (changes.Rects().size() > MOST_CHANGED_RECTS)
+            changes = platform::PixelRegion(changes.Bounds());
+        if (m_pointer != before.m_pointer) {
+            changes.Add(before.m_pointer.Rect());
+            changes.Add(m_pointer.Rect());
+        }
+        // It is drawn as a whole, on windows that are drawn anew.
+        if (m_pointer.Touches(changes))
+            changes.Add(m_pointer.Rect());
+        if (!m_drawing.CanDrawPart(changes))
+            return std::nullopt;
+        return changes;
+    }
+
+    /// Whether the pointer is to be drawn with such a part.
+    bool HasPointerIn(const platform::PixelRegion& part) const { return m_pointer.Touches(part); }
+
+private:
+    struct Pointer {
+        platform::CGImageRef image; // null for none
+        platform::CGRect rect;
+        platform::PixelBox box; // within the frame
+
+        platform::PixelRect Rect() const {
+            return {static_cast<int>(box.left), static_cast<int>(box.top), static_cast<int>(box.right),
+                    static_cast<int>(box.bottom)};
+        }
+        bool Touches(const platform::PixelRegion& region) const {
+            platform::PixelRegion common(Rect());
+            common.Intersect(region);
+            return !common.IsEmpty();
+        }
+        bool operator==(const Pointer&) const = default;
+    };
+
+    bool IsSameGround(const Note& other) const {
+        return m_size == other.m_size && m_background == other.m_background;
+    }
+
+    TVLSize m_size{};
+    std::optional<int> m_background; // nothing where none of it is seen
+    platform::WindowImageDrawing m_drawing;
+    Pointer m_pointer;
 };
 
 CShareCGSCapturer::CShareCGSCapturer(const std::shared_ptr<ShareCapturerContext>& context)
@@ -145,7 +237,7 @@ int CShareCGSCapturer::capture(IShareFrame* frame, unsigned display, TVLSize bit
     }
     m_rectCapturedDisplay = platform::CGDisplayBounds(display);
 
-    Pass pass{bitmap, capture, nullptr, {}, m_rectCapturedDisplay, isDesktopSharing()};
+    Pass pass{bitmap, capture, nullptr, {}, m_rectCapturedDisplay, isDesktopSharing(), {}, {}};
     const int result = createShareImage(m_rectCapturedDisplay, pass.image, pass.imageRect);
     if (result == SHARE_CAPTURE_NO_DATA)
         pass.imageRect = m_rectLastCapture.size.width != 0 ? m_rectLastCapture : m_rectCapturedDisplay;
@@ -154,19 +246,36 @@ int CShareCGSCapturer::capture(IShareFrame* frame, unsigned display, TVLSize bit
     if (IsWindowArea())
         FitToWindows(pass);
 
-    frame->Reset();
-    frame->SetFrameDataFormat(SHARE_FRAME_FORMAT_RGBA);
-    frame->SetFrameSize(pass.bitmap);
+    auto* const own = dynamic_cast<CShareFrame*>(frame);
+    std::unique_ptr<Note> before = own != nullptr ? TakeNote(*own) : nullptr;
+    PrepareFrame(*frame, pass);
     m_rectLastCapture = pass.drawRect;
-    initCapturerByData(frame->GetFrameData(),
-                       static_cast<unsigned long>(std::max(frame->GetFrameDataLen(), 0)), pass.bitmap);
-    PaintBackground(pass);
     if (pass.image != nullptr) {
-        DrawPicture(pass);
-        DrawPointer(pass.drawRect);
+        pass.place = PlaceOf(pass);
+        FindPointer(pass);
     }
+    Show(pass, own, before.get());
+    if (m_note == nullptr)
+        m_note = std::move(before);
     frame->SetMetaInfo({ShareUtilMac::CGRectToTVLRect(pass.drawRect), m_bPointerCaptured});
     return SHARE_CAPTURE_OK;
+}
+
+/// Null also for a note of somebody else.
+std::unique_ptr<CShareCGSCapturer::Note> CShareCGSCapturer::TakeNote(CShareFrame& frame) {
+    std::unique_ptr<ShareFrameNote> note = frame.TakeNote();
+    auto* const ours = dynamic_cast<Note*>(note.get());
+    if (ours != nullptr)
+        static_cast<void>(note.release());
+    return std::unique_ptr<Note>(ours);
+}
+
+void CShareCGSCapturer::PrepareFrame(IShareFrame& frame, const Pass& pass) {
+    frame.Reset();
+    frame.SetFrameDataFormat(SHARE_FRAME_FORMAT_RGBA);
+    frame.SetFrameSize(pass.bitmap);
+    initCapturerByData(frame.GetFrameData(), static_cast<unsigned long>(std::max(frame.GetFrameDataLen(), 0)),
+                       pass.bitmap);
 }
 
 void CShareCGSCapturer::initCapturerByData(unsigned char* data, unsigned long length, TVLSize size) {
@@ -182,15 +291,6 @@ void CShareCGSCapturer::initCapturerByData(unsigned char* data, unsigned long le
     // Nothing will be painted then, and what the memory held was some earlier picture.
     if (m_bmpContext == nullptr && data != nullptr)
         std::memset(data, 0, length);
-}
-
-/// Frames are used again and again: what the picture doesn't cover would still show an earlier one, of
-/// windows that may be kept out by now.
-void CShareCGSCapturer::PaintBackground(const Pass& pass) {
-    if (!pass.isDesktop)
-        FillWhole(m_bmpContext.get(), pass.bitmap, AppShareConfig::Instance()->m_nAppShareBackgroundColor);
-    else if (!pass.CoversFrame())
-        FillWhole(m_bmpContext.get(), pass.bitmap, BLACK);
 }
 
 /// Where the picture goes, counted from the bottom of the frame.
@@ -209,18 +309,11 @@ platform::CGRect CShareCGSCapturer::PlaceOf(const Pass& pass) const {
              whole.size.height * image.size.height / bounds.size.height}};
 }
 
-void CShareCGSCapturer::DrawPicture(const Pass& pass) {
-    const platform::CGRect place = PlaceOf(pass);
-    ShareDumpTimeUsage usage;
-    const bool isWhole = platform::CGContextDrawWindowImage(m_bmpContext.get(), place, pass.image.get());
-    // Where a layer is missing, the frame may still show an earlier picture.
-    if (!isWhole && pass.CoversFrame())
-        FillWhole(m_bmpContext.get(), pass.bitmap, BLACK);
-    TraceDrawing(usage, pass.image.get(), place);
-}
-
-void CShareCGSCapturer::DrawPointer(const platform::CGRect& drawRect) {
-    const platform::CGPoint location = platform::CGEventGetLocation(platform::CGEventCreate(nullptr));
+void CShareCGSCapturer::FindPointer(Pass& pass) {
+    const std::optional<platform::CGPoint> told = platform::CGWindowImageGetPointer(pass.image.get());
+    const platform::CGPoint location =
+        told ? *told : platform::CGEventGetLocation(platform::CGEventCreate(nullptr));
+    const platform::CGRect& drawRect = pass.drawRect;
     if (!platform::CGRectContainsPoint(drawRect, location)) {
         m_bPointerCaptured = true;
         return;
@@ -230,7 +323,84 @@ void CShareCGSCapturer::DrawPointer(const platform::CGRect& drawRect) {
     const float scale = AppShareConfig::Instance()->GetCurrentScale();
     const platform::CGPoint place{(location.x - drawRect.origin.x) * scale,
                                   (location.y - drawRect.origin.y) * scale};
-    m_bPointerCaptured = ShareUtilMac::CaptureCursorToCGContext(m_bmpContext.get(), place, scale);
+    pass.pointer = ShareUtilMac::FindCursor(m_bmpContext.get(), place, scale);
+    m_bPointerCaptured = pass.pointer.has_value();
+}
+
+// ---- Drawing
+
+/// The frame has no note meanwhile, so that none is left by a drawing that doesn't come to its end.
+void CShareCGSCapturer::Show(const Pass& pass, CShareFrame* frame, const Note* before) {
+    ShareDumpTimeUsage usage;
+    const bool isKnown = frame != nullptr && frame->AllowsNote() && Describe(pass);
+    const bool isShown =
+        isKnown && before != nullptr && (m_note->IsSameAs(*before) || DrawChanges(pass, *before));
+    const bool isWhole = isShown || DrawAll(pass);
+    if (pass.image != nullptr)
+        TraceDrawing(usage, pass.image.get(), pass.place);
+    if (isKnown && isWhole)
+        frame->PutNote(std::move(m_note));
+}
+
+/// False when it can't be told what the frame will show.
+bool CShareCGSCapturer::Describe(const Pass& pass) noexcept {
+    try {
+        if (m_note == nullptr)
+            m_note = std::make_unique<Note>();
+        return m_note->Describe(pass, m_bmpContext.get());
+    } catch (const std::bad_alloc&) {
+        return false;
+    }
+}
+
+/// False when all has to be drawn.
+bool CShareCGSCapturer::DrawChanges(const Pass& pass, const Note& before) {
+    try {
+        const std::optional<platform::PixelRegion> changes = m_note->ChangesSince(before, pass.image.get());
+        return changes && DrawPart(pass, *changes);
+    } catch (const std::bad_alloc&) {
+        return false;
+    }
+}
+
+/// False when memory ran out and something may be missing. Throws std::bad_alloc before anything is drawn.
+bool CShareCGSCapturer::DrawPart(const Pass& pass, const platform::PixelRegion& part) {
+    const std::vector<platform::PixelRect> rects = part.Rects();
+    const bool hasPointer = m_note->HasPointerIn(part);
+    bool isWhole = true;
+    for (const platform::PixelRect& rect : rects) {
+        platform::CGContextSetClip(m_bmpContext.get(), {rect.left, rect.top, rect.right, rect.bottom});
+        PaintBackground(pass);
+        isWhole &= platform::CGContextDrawWindowImage(m_bmpContext.get(), pass.place, pass.image.get());
+    }
+    platform::CGContextResetClip(m_bmpContext.get());
+    if (hasPointer)
+        DrawPointer(pass);
+    return isWhole;
+}
+
+bool CShareCGSCapturer::DrawAll(const Pass& pass) {
+    PaintBackground(pass);
+    if (pass.image == nullptr)
+        return true;
+    const bool isWhole = platform::CGContextDrawWindowImage(m_bmpContext.get(), pass.place, pass.image.get());
+    // Where a layer is missing, the frame may still show an earlier picture.
+    if (!isWhole && pass.CoversClip(m_bmpContext.get()))
+        FillWhole(m_bmpContext.get(), pass.bitmap, pass.Background());
+    DrawPointer(pass);
+    return isWhole;
+}
+
+/// Frames are used again and again: what the picture doesn't cover would still show an earlier one, of
+/// windows that may be kept out by now.
+void CShareCGSCapturer::PaintBackground(const Pass& pass) {
+    if (!pass.CoversClip(m_bmpContext.get()))
+        FillWhole(m_bmpContext.get(), pass.bitmap, pass.Background());
+}
+
+void CShareCGSCapturer::DrawPointer(const Pass& pass) {
+    if (pass.pointer)
+        platform::CGContextDrawImage(m_bmpContext.get(), pass.pointer->rect, pass.pointer->image.get());
 }
 
 // ---- Windows

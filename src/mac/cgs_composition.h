@@ -12,14 +12,21 @@
 #include <span>
 #include <vector>
 
+class CShareFrame;
 class IShareFrame;
 class ShareCapturerContext;
+
+namespace platform {
+class PixelRegion;
+} // namespace platform
 
 /// Makes one finished picture from the window server on demand: of the windows that are shared and of no
 /// other, scaled, centred, on its background, with the pointer on top.
 ///
 /// Frame:    RGBA without alpha, drawn straight into its memory. Whatever a pass doesn't draw on is painted
-///           over first, so that a frame that is used again shows nothing of before.
+///           over first, so that a frame that is used again shows nothing of before. A frame that has kept a
+///           note on what it shows (src/share_frame_note.h) is drawn only where it is to show something else,
+///           with the same pixels in the end; where that isn't known for certain, all of it is drawn.
 /// Lifetime: keeps a bitmap context on the memory of the frame that it drew into last, and touches that only
 ///           in a pass that is given the same memory.
 /// Threads:  one at a time.
@@ -73,13 +80,24 @@ public:
 private:
     /// What a pass has found out so far.
     struct Pass;
+    /// What a frame shows that has come from here.
+    class Note;
 
     bool IsWindowArea() const;
     void FitToWindows(Pass& pass);
     platform::CGRect PlaceOf(const Pass& pass) const;
+    void FindPointer(Pass& pass);
+    static std::unique_ptr<Note> TakeNote(CShareFrame& frame);
+    void PrepareFrame(IShareFrame& frame, const Pass& pass);
+
+    /// Makes the frame show what the pass has found.
+    void Show(const Pass& pass, CShareFrame* frame, const Note* before);
+    bool Describe(const Pass& pass) noexcept;
+    bool DrawChanges(const Pass& pass, const Note& before);
+    bool DrawPart(const Pass& pass, const platform::PixelRegion& part);
+    bool DrawAll(const Pass& pass);
     void PaintBackground(const Pass& pass);
-    void DrawPicture(const Pass& pass);
-    void DrawPointer(const platform::CGRect& drawRect);
+    void DrawPointer(const Pass& pass);
 
     std::shared_ptr<ShareCapturerContext> m_shareCapturerContext;
     TVLSize m_sizeBmpContext{};
@@ -91,5 +109,6 @@ private:
     platform::CGContextRef m_bmpContext; // on m_pFrameData
     unsigned char* m_pFrameData = nullptr;
     platform::CGRect m_rectLastCapture;
+    std::unique_ptr<Note> m_note; // of this pass while it lasts, then any that can be written over
     bool m_bPointerCaptured = false;
 };
