@@ -15,6 +15,7 @@
 #include <ctime>
 #include <memory>
 #include <numeric>
+#include <utility>
 #include <vector>
 
 namespace {
@@ -25,8 +26,8 @@ using Bytes = std::vector<std::uint8_t>;
 constexpr int WIDTH = 1920;
 constexpr int HEIGHT = 1080;
 
-Bytes Noise(std::size_t size) {
-    Bytes bytes(size);
+Bytes Noise(int width, int height) {
+    Bytes bytes(static_cast<std::size_t>(width) * static_cast<std::size_t>(height) * 4);
     std::uint32_t state = 1;
     for (std::uint8_t& byte : bytes) {
         state = state * 1664525 + 1013904223;
@@ -35,11 +36,20 @@ Bytes Noise(std::size_t size) {
     return bytes;
 }
 
+/// Noise whose last byte of each pixel, which may be its alpha, is 255.
+Bytes OpaqueNoise(int width, int height) {
+    Bytes bytes = Noise(width, height);
+    for (std::size_t i = 3; i < bytes.size(); i += 4)
+        bytes[i] = 255;
+    return bytes;
+}
+
 class Picture {
 public:
     Picture(int width, int height, CGPixelLayout layout)
-        : m_pixels(std::make_shared<Bytes>(
-              Noise(static_cast<std::size_t>(width) * static_cast<std::size_t>(height) * 4))),
+        : Picture(width, height, layout, Noise(width, height)) {}
+    Picture(int width, int height, CGPixelLayout layout, Bytes pixels)
+        : m_pixels(std::make_shared<Bytes>(std::move(pixels))),
           m_image(CGImageCreate(width, height, static_cast<std::size_t>(width) * 4, layout, m_pixels->data(),
                                 m_pixels)) {}
 
@@ -172,8 +182,20 @@ void DrawUnscaledAgainstMemcpy(benchmark::State& state) {
 }
 BENCHMARK(DrawUnscaledAgainstMemcpy)
     ->Arg(static_cast<int>(CGPixelLayout::BGRX))
+    ->Arg(static_cast<int>(CGPixelLayout::RGBX))
     ->Arg(static_cast<int>(CGPixelLayout::BGRA))
     ->UseManualTime()
     ->Unit(benchmark::kMicrosecond);
+
+/// The same of a window that could be translucent and is not; no goal.
+void DrawOpaqueAlphaAgainstMemcpy(benchmark::State& state) {
+    const Picture picture(WIDTH, HEIGHT, CGPixelLayout::BGRA, OpaqueNoise(WIDTH, HEIGHT));
+    Canvas canvas(WIDTH, HEIGHT, kCGImageAlphaNoneSkipLast);
+    Bytes other(canvas.Pixels().size());
+    Compare(
+        state, [&] { CGContextDrawImage(canvas.Context(), Whole(WIDTH, HEIGHT), picture.Image()); },
+        [&] { std::memcpy(other.data(), picture.Pixels(), other.size()); });
+}
+BENCHMARK(DrawOpaqueAlphaAgainstMemcpy)->UseManualTime()->Unit(benchmark::kMicrosecond);
 
 } // namespace

@@ -5,6 +5,8 @@
 
 #include <algorithm>
 #include <array>
+#include <atomic>
+#include <bit>
 #include <cstring>
 
 namespace platform {
@@ -54,33 +56,111 @@ void ForEachPiece(std::size_t count, Work work) {
         work(done, std::min(count - done, PIXELS_PER_PIECE));
 }
 
-void Reorder(Order from, const std::uint8_t* source, Order to, std::uint8_t* target, std::size_t count) {
+// ---- Loops, each with a Run that is compiled for any processor and once more for those with wider
+// registers. They are written so that compilers work on many pixels at once.
+
+std::atomic<bool> g_mayRunWide{true};
+
+#if defined(__x86_64__)
+bool IsWide() {
+    return g_mayRunWide.load(std::memory_order_relaxed) && __builtin_cpu_supports("avx2");
+}
+
+template <class Loop, class... Arguments>
+[[gnu::target("avx2")]] void RunWide(Arguments... arguments) {
+    Loop::Run(arguments...);
+}
+#else
+bool IsWide() {
+    return false;
+}
+
+template <class Loop, class... Arguments>
+void RunWide(Arguments... arguments) {
+    Loop::Run(arguments...);
+}
+#endif
+
+template <class Loop, class... Arguments>
+void RunLoop(Arguments... arguments) {
+    if (IsWide())
+        RunWide<Loop>(arguments...);
+    else
+        Loop::Run(arguments...);
+}
+
+static_assert(std::endian::native == std::endian::little,
+              "the first byte of a pixel is the lowest of its word");
+
+[[gnu::always_inline]] inline std::uint32_t ReadPixel(const std::uint8_t* pixels, std::size_t index) {
+    std::uint32_t pixel = 0;
+    std::memcpy(&pixel, pixels + index * 4, 4);
+    return pixel;
+}
+
+[[gnu::always_inline]] inline void WritePixel(std::uint8_t* pixels, std::size_t index, std::uint32_t pixel) {
+    std::memcpy(pixels + index * 4, &pixel, 4);
+}
+
+struct Same {
+    static std::uint32_t Turned(std::uint32_t pixel) { return pixel; }
+};
+struct FirstAndThirdSwapped {
+    static std::uint32_t Turned(std::uint32_t pixel) { return std::rotr(__builtin_bswap32(pixel), 8); }
+};
+struct Reversed {
+    static std::uint32_t Turned(std::uint32_t pixel) { return __builtin_bswap32(pixel); }
+};
+struct LastToFront {
+    static std::uint32_t Turned(std::uint32_t pixel) { return std::rotl(pixel, 8); }
+};
+struct FrontToLast {
+    static std::uint32_t Turned(std::uint32_t pixel) { return std::rotr(pixel, 8); }
+};
+
+/// Reads and writes all memory once, which is what it takes its time for. `set` has the bits that are set in
+/// each pixel. Compilers have to see where source and target are one.
+template <class Order>
+struct TurnLoop {
+    [[gnu::always_inline]] static void Run(const std::uint8_t* source, std::uint8_t* target,
+                                           std::size_t count, std::uint32_t set) {
+        if (source == target) {
+            for (std::size_t i = 0; i < count; ++i)
+                WritePixel(target, i, Order::Turned(ReadPixel(target, i)) | set);
+            return;
+        }
+        for (std::size_t i = 0; i < count; ++i)
+            WritePixel(target, i, Order::Turned(ReadPixel(source, i)) | set);
+    }
+};
+
+/// The bits of a byte within a pixel's word.
+constexpr std::uint32_t BitsOf(std::size_t byte) {
+    return std::uint32_t{0xff} << (byte * 8);
+}
+
+/// With `isOpaque`, the target's byte for alpha becomes 255.
+void Reorder(Order from, const std::uint8_t* source, Order to, std::uint8_t* target, std::size_t count,
+             bool isOpaque) {
+    const std::uint32_t set = isOpaque ? BitsOf(to.alpha) : 0;
     if (from == to) {
-        if (source != target)
+        if (isOpaque)
+            RunLoop<TurnLoop<Same>>(source, target, count, set);
+        else if (source != target)
             std::memcpy(target, source, count * 4);
-        return;
+    } else if (from.alpha == to.alpha) {
+        RunLoop<TurnLoop<FirstAndThirdSwapped>>(source, target, count, set);
+    } else if (to.red == from.red + 1 && to.green == from.green + 1) {
+        RunLoop<TurnLoop<LastToFront>>(source, target, count, set);
+    } else if (to.red + 1 == from.red && to.green + 1 == from.green) {
+        RunLoop<TurnLoop<FrontToLast>>(source, target, count, set);
+    } else {
+        RunLoop<TurnLoop<Reversed>>(source, target, count, set);
     }
-    std::array<std::uint8_t, 16> shuffler{};
-    for (std::size_t pixel = 0; pixel < shuffler.size(); pixel += 4) {
-        shuffler[pixel + to.red] = static_cast<std::uint8_t>(pixel + from.red);
-        shuffler[pixel + to.green] = static_cast<std::uint8_t>(pixel + from.green);
-        shuffler[pixel + to.blue] = static_cast<std::uint8_t>(pixel + from.blue);
-        shuffler[pixel + to.alpha] = static_cast<std::uint8_t>(pixel + from.alpha);
-    }
-    libyuv::ARGBShuffle(source, 0, target, 0, shuffler.data(), static_cast<int>(count), 1);
 }
 
 void MakeOpaque(std::uint8_t* pixels, Order order, std::size_t count) {
-    std::uint32_t opaque = 0;
-    std::array<std::uint8_t, 4> bytes{};
-    bytes[order.alpha] = 255;
-    std::memcpy(&opaque, bytes.data(), bytes.size());
-    for (std::size_t i = 0; i < count; ++i) {
-        std::uint32_t pixel = 0;
-        std::memcpy(&pixel, pixels + i * 4, 4);
-        pixel |= opaque;
-        std::memcpy(pixels + i * 4, &pixel, 4);
-    }
+    Reorder(order, pixels, order, pixels, count, true);
 }
 
 /// libyuv tells the first component's byte by names of its own: what it calls RGB24 and ARGB share it.
@@ -99,31 +179,70 @@ bool HasFourComponentBytes(CGPixelLayout layout) {
     return layout != CGPixelLayout::RGB && layout != CGPixelLayout::X2R10G10B10;
 }
 
-/// Written so that compilers work on many bytes at once.
-void BlendBytes(const std::uint8_t* source, const std::uint8_t* alpha, std::uint8_t* target,
-                std::size_t count) {
-    for (std::size_t i = 0; i < count; ++i) {
-        const auto product = static_cast<std::uint16_t>(target[i] * (255 - alpha[i]) + 128);
-        const auto rest = static_cast<std::uint16_t>((product + (product >> 8)) >> 8);
-        // A colour above its alpha is nothing that premultiplied pixels may hold, but they come from outside.
-        target[i] = static_cast<std::uint8_t>(std::min<std::uint16_t>(source[i] + rest, 255));
+/// `alpha` has the alpha of each byte's pixel.
+struct BlendLoop {
+    [[gnu::always_inline]] static void Run(const std::uint8_t* source, const std::uint8_t* alpha,
+                                           std::uint8_t* target, std::size_t count) {
+        for (std::size_t i = 0; i < count; ++i) {
+            const auto product = static_cast<std::uint16_t>(target[i] * (255 - alpha[i]) + 128);
+            const auto rest = static_cast<std::uint16_t>((product + (product >> 8)) >> 8);
+            // A colour above its alpha is nothing that premultiplied pixels may hold, but they come from
+            // outside.
+            target[i] = static_cast<std::uint8_t>(std::min<std::uint16_t>(source[i] + rest, 255));
+        }
     }
-}
+};
 
-void Blend4Bytes(const std::uint8_t* source, std::size_t alphaIndex, std::uint8_t* target,
-                 std::size_t count) {
+/// The bits that all pixels have, and those that any has.
+struct Bits {
+    std::uint32_t all = 0xffffffff;
+    std::uint32_t any = 0;
+};
+
+struct BitsLoop {
+    [[gnu::always_inline]] static void Run(const std::uint8_t* pixels, std::size_t count, Bits* bits) {
+        Bits found;
+        for (std::size_t i = 0; i < count; ++i) {
+            const std::uint32_t pixel = ReadPixel(pixels, i);
+            found.all &= pixel;
+            found.any |= pixel;
+        }
+        *bits = found;
+    }
+};
+
+/// Most of a window that has alpha is opaque, and most of the rest is empty: to lay the one over a row is to
+/// copy it, and of the other nothing comes. A byte that isn't alpha in the target becomes 255 there.
+void Blend4Bytes(const std::uint8_t* source, CGPixelLayout layout, std::uint8_t* target, std::size_t count) {
+    const Order order = OrderOf(layout);
     std::array<std::uint8_t, 16> onlyAlpha{};
     for (std::size_t i = 0; i < onlyAlpha.size(); ++i)
-        onlyAlpha[i] = static_cast<std::uint8_t>(i - i % 4 + alphaIndex);
+        onlyAlpha[i] = static_cast<std::uint8_t>(i - i % 4 + order.alpha);
     ForEachPiece(count, [&](std::size_t offset, std::size_t pixels) {
-        Piece alpha;
-        libyuv::ARGBShuffle(source + offset * 4, 0, alpha.data(), 0, onlyAlpha.data(),
-                            static_cast<int>(pixels), 1);
-        BlendBytes(source + offset * 4, alpha.data(), target + offset * 4, pixels * 4);
+        const std::uint8_t* const from = source + offset * 4;
+        std::uint8_t* const to = target + offset * 4;
+        Bits bits;
+        RunLoop<BitsLoop>(from, pixels, &bits);
+        if ((bits.all & BitsOf(order.alpha)) == BitsOf(order.alpha)) {
+            std::memcpy(to, from, pixels * 4);
+            return;
+        }
+        if (bits.any != 0) {
+            Piece alpha;
+            libyuv::ARGBShuffle(from, 0, alpha.data(), 0, onlyAlpha.data(), static_cast<int>(pixels), 1);
+            RunLoop<BlendLoop>(static_cast<const std::uint8_t*>(from),
+                               static_cast<const std::uint8_t*>(alpha.data()), to, pixels * 4);
+        }
+        if (!CGHasAlpha(layout))
+            MakeOpaque(to, order, pixels);
     });
 }
 
 } // namespace
+
+void AllowWideLoops(bool allowed) noexcept {
+    g_mayRunWide = allowed;
+}
 
 void ConvertRow(CGPixelLayout from, const std::uint8_t* source, CGPixelLayout to, std::uint8_t* target,
                 std::size_t count) noexcept {
@@ -137,30 +256,26 @@ void ConvertRow(CGPixelLayout from, const std::uint8_t* source, CGPixelLayout to
         });
     } else {
         const Order order = OrderOf(to);
+        const bool isOpaque = !CGHasAlpha(from) || !CGHasAlpha(to);
         if (HasFourComponentBytes(from)) {
-            Reorder(OrderOf(from), source, order, target, count);
+            Reorder(OrderOf(from), source, order, target, count, isOpaque);
         } else {
             ExpandTo4Bytes(from, source, target, count);
-            Reorder(RGBA_ORDER, target, order, target, count);
+            Reorder(RGBA_ORDER, target, order, target, count, isOpaque);
         }
-        if (!CGHasAlpha(from) || !CGHasAlpha(to))
-            MakeOpaque(target, order, count);
     }
 }
 
 void BlendRow(const std::uint8_t* source, CGPixelLayout layout, std::uint8_t* target,
               std::size_t count) noexcept {
-    const Order order = OrderOf(layout);
     if (layout != CGPixelLayout::RGB) {
-        Blend4Bytes(source, order.alpha, target, count);
-        if (!CGHasAlpha(layout))
-            MakeOpaque(target, order, count);
+        Blend4Bytes(source, layout, target, count);
         return;
     }
     ForEachPiece(count, [=](std::size_t offset, std::size_t pixels) {
         Piece rgba;
         ExpandTo4Bytes(CGPixelLayout::RGB, target + offset * 3, rgba.data(), pixels);
-        Blend4Bytes(source + offset * 4, order.alpha, rgba.data(), pixels);
+        Blend4Bytes(source + offset * 4, CGPixelLayout::RGBX, rgba.data(), pixels);
         ContractTo3Bytes(rgba.data(), target + offset * 3, pixels);
     });
 }
@@ -179,7 +294,7 @@ void DrawRow(CGPixelLayout from, const std::uint8_t* source, CGPixelLayout to, s
     }
     ForEachPiece(count, [=](std::size_t offset, std::size_t pixels) {
         Piece reordered;
-        Reorder(sourceOrder, source + offset * 4, targetOrder, reordered.data(), pixels);
+        Reorder(sourceOrder, source + offset * 4, targetOrder, reordered.data(), pixels, false);
         BlendRow(reordered.data(), to, target + offset * CGBytesPerPixel(to), pixels);
     });
 }

@@ -31,4 +31,8 @@ void DrawRow(CGPixelLayout from, const std::uint8_t* source, CGPixelLayout to, s
 void DrawFadedRow(CGPixelLayout from, const std::uint8_t* source, std::uint8_t alpha, CGPixelLayout to,
                   std::uint8_t* target, std::size_t count) noexcept;
 
+/// Whether the loops may use the wider registers that the processor has, as they do at first; the pixels are
+/// the same either way. For tests. Any thread.
+void AllowWideLoops(bool allowed) noexcept;
+
 } // namespace platform

@@ -1,0 +1,155 @@
+// SPDX-License-Identifier: Apache-2.0
+#include "platform/pixel_rows.h"
+
+#include "tests/support/test_effort.h"
+
+#include <gtest/gtest.h>
+
+#include <algorithm>
+#include <array>
+#include <cstdint>
+#include <random>
+#include <string>
+#include <vector>
+
+/// Rows against a model that goes pixel by pixel, with and without wide registers.
+
+namespace {
+
+using namespace platform;
+using Bytes = std::vector<std::uint8_t>;
+
+constexpr std::array LAYOUTS{CGPixelLayout::RGB,  CGPixelLayout::RGBX, CGPixelLayout::RGBA,
+                             CGPixelLayout::ARGB, CGPixelLayout::BGRX, CGPixelLayout::BGRA};
+
+struct Colour {
+    int red, green, blue, alpha;
+};
+
+/// Where red, green, blue and the fourth byte lie.
+std::array<std::size_t, 4> Places(CGPixelLayout layout) {
+    switch (layout) {
+        case CGPixelLayout::ARGB:
+            return {1, 2, 3, 0};
+        case CGPixelLayout::BGRX:
+        case CGPixelLayout::BGRA:
+            return {2, 1, 0, 3};
+        default:
+            return {0, 1, 2, 3};
+    }
+}
+
+Colour ColourAt(const Bytes& row, CGPixelLayout layout, std::size_t at) {
+    const auto places = Places(layout);
+    const std::uint8_t* const pixel = row.data() + at * CGBytesPerPixel(layout);
+    return {pixel[places[0]], pixel[places[1]], pixel[places[2]],
+            CGHasAlpha(layout) ? pixel[places[3]] : 255};
+}
+
+void Write(Bytes& row, CGPixelLayout layout, std::size_t at, const Colour& colour) {
+    const auto places = Places(layout);
+    std::uint8_t* const pixel = row.data() + at * CGBytesPerPixel(layout);
+    pixel[places[0]] = static_cast<std::uint8_t>(colour.red);
+    pixel[places[1]] = static_cast<std::uint8_t>(colour.green);
+    pixel[places[2]] = static_cast<std::uint8_t>(colour.blue);
+    if (layout != CGPixelLayout::RGB)
+        pixel[places[3]] = static_cast<std::uint8_t>(CGHasAlpha(layout) ? colour.alpha : 255);
+}
+
+int Over(int above, int below, int alpha) {
+    const double rest = below * (255 - alpha) / 255.0;
+    return std::min(above + static_cast<int>(rest + 0.5), 255);
+}
+
+Colour Over(const Colour& above, const Colour& below) {
+    return {Over(above.red, below.red, above.alpha), Over(above.green, below.green, above.alpha),
+            Over(above.blue, below.blue, above.alpha), Over(above.alpha, below.alpha, above.alpha)};
+}
+
+enum class Content {
+    Noise,
+    Opaque,
+    Empty,
+    Stretches
+};
+
+class Row {
+public:
+    Row(std::mt19937& random, CGPixelLayout layout, std::size_t count, Content content)
+        : bytes(count * CGBytesPerPixel(layout)) {
+        for (std::uint8_t& byte : bytes)
+            byte = static_cast<std::uint8_t>(random());
+        if (layout == CGPixelLayout::RGB || content == Content::Noise)
+            return;
+        Content now = content;
+        for (std::size_t i = 0; i < count; ++i) {
+            if (content == Content::Stretches && random() % 200 == 0)
+                now = static_cast<Content>(random() % 3);
+            std::uint8_t* const pixel = bytes.data() + i * 4;
+            if (now == Content::Opaque)
+                pixel[Places(layout)[3]] = 255;
+            else if (now == Content::Empty)
+                std::fill_n(pixel, 4, std::uint8_t{0});
+        }
+    }
+
+    Bytes bytes;
+};
+
+class PixelRows : public testing::TestWithParam<bool> {
+protected:
+    PixelRows() { AllowWideLoops(GetParam()); }
+    ~PixelRows() override { AllowWideLoops(true); }
+
+    std::size_t SomeCount() { return 1 + m_random() % 700; }
+    CGPixelLayout SomeLayout() { return LAYOUTS[m_random() % LAYOUTS.size()]; }
+    Content SomeContent() { return static_cast<Content>(m_random() % 4); }
+
+    const unsigned m_seed = std::random_device{}();
+    std::mt19937 m_random{m_seed};
+};
+
+std::string Named(CGPixelLayout from, CGPixelLayout to, std::size_t count, unsigned seed) {
+    return std::to_string(static_cast<int>(from)) + " to " + std::to_string(static_cast<int>(to)) + ", " +
+           std::to_string(count) + " pixels, seed " + std::to_string(seed);
+}
+
+} // namespace
+
+TEST_P(PixelRows, AreConvertedPixelByPixel) {
+    for (int i = 0; i < 3000 * TestEffort(); ++i) {
+        const CGPixelLayout from = SomeLayout();
+        const CGPixelLayout to = SomeLayout();
+        const std::size_t count = SomeCount();
+        const Row source(m_random, from, count, SomeContent());
+        Bytes target(count * CGBytesPerPixel(to), 0x5a);
+        Bytes expected = target;
+        for (std::size_t at = 0; at < count; ++at)
+            Write(expected, to, at, ColourAt(source.bytes, from, at));
+        ConvertRow(from, source.bytes.data(), to, target.data(), count);
+        ASSERT_EQ(target, expected) << Named(from, to, count, m_seed);
+        if (from == CGPixelLayout::RGB || to == CGPixelLayout::RGB)
+            continue;
+        Bytes inPlace = source.bytes;
+        ConvertRow(from, inPlace.data(), to, inPlace.data(), count);
+        ASSERT_EQ(inPlace, expected) << "in place, " << Named(from, to, count, m_seed);
+    }
+}
+
+TEST_P(PixelRows, AreLaidOverOthersPixelByPixel) {
+    for (int i = 0; i < 3000 * TestEffort(); ++i) {
+        const CGPixelLayout from = SomeLayout();
+        const CGPixelLayout to = SomeLayout();
+        const std::size_t count = SomeCount();
+        const Row source(m_random, from, count, SomeContent());
+        Bytes target = Row(m_random, to, count, Content::Noise).bytes;
+        Bytes expected = target;
+        for (std::size_t at = 0; at < count; ++at)
+            Write(expected, to, at, Over(ColourAt(source.bytes, from, at), ColourAt(target, to, at)));
+        DrawRow(from, source.bytes.data(), to, target.data(), count);
+        ASSERT_EQ(target, expected) << Named(from, to, count, m_seed);
+    }
+}
+
+INSTANTIATE_TEST_SUITE_P(Registers, PixelRows, testing::Bool(),
+                         [](const auto& each) { return each.param ? "Wide" : "Baseline"; });
