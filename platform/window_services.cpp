@@ -36,6 +36,13 @@ CGError LookUp(CGSConnectionID connection, CGWindowID id, const void* out, Ask a
     return window != nullptr ? ask(*window) : kCGErrorIllegalArgument;
 }
 
+CGError OwnerOf(const WindowInfo& window, CGSConnectionID* owner) {
+    if (window.owner <= 0)
+        return kCGErrorFailure;
+    *owner = ConnectionOf(window.owner);
+    return kCGErrorSuccess;
+}
+
 /// Calls `fn` with each window on screen that `target` has, the front one first, and gives their number.
 template <class Fn>
 int ForEachOnScreen(const WindowSnapshot& windows, CGSConnectionID target, Fn fn) {
@@ -85,6 +92,10 @@ std::uint64_t PinnedWindowGeneration() noexcept {
     return pinned != nullptr ? pinned->Generation() : 0;
 }
 
+CGSMoment CGSPinnedMoment() noexcept {
+    return {PinnedWindows(), WindowServerInUse()->GetDisplays()};
+}
+
 CGError CGSGetWindowLevel(CGSConnectionID connection, CGWindowID window, int* level) noexcept {
     return LookUp(connection, window, level, [level](const WindowInfo& info) {
         *level = info.level;
@@ -106,13 +117,28 @@ CGError CGSGetScreenRectForWindow(CGSConnectionID connection, CGWindowID window,
     });
 }
 
-CGError CGSGetWindowOwner(CGSConnectionID connection, CGWindowID window, CGSConnectionID* owner) noexcept {
-    return LookUp(connection, window, owner, [owner](const WindowInfo& info) {
-        if (info.owner <= 0)
-            return kCGErrorFailure;
-        *owner = ConnectionOf(info.owner);
+CGError CGSGetSharingState(CGSConnectionID connection, CGWindowID window,
+                           CGWindowSharingType* state) noexcept {
+    return LookUp(connection, window, state, [state](const WindowInfo& info) {
+        *state = static_cast<CGWindowSharingType>(info.sharing);
         return kCGErrorSuccess;
     });
+}
+
+CGError CGSGetWindowOwner(CGSConnectionID connection, CGWindowID window, CGSConnectionID* owner) noexcept {
+    return LookUp(connection, window, owner,
+                  [owner](const WindowInfo& info) { return OwnerOf(info, owner); });
+}
+
+CGSWindowOwners::CGSWindowOwners(CGSConnectionID connection) noexcept
+    : m_connection(connection),
+      m_windows(WindowsForLookUp()) {}
+
+CGError CGSWindowOwners::Get(CGWindowID window, CGSConnectionID* owner) const noexcept {
+    if (const CGError error = Check(m_connection, owner))
+        return error;
+    const WindowInfo* const info = static_cast<const WindowSnapshot*>(m_windows.get())->Find(window);
+    return info != nullptr ? OwnerOf(*info, owner) : kCGErrorIllegalArgument;
 }
 
 CGError CGSConnectionGetPID(CGSConnectionID connection, pid_t* pid) noexcept {

@@ -6,6 +6,7 @@
 
 #include <sys/types.h>
 #include <cstdint>
+#include <memory>
 
 /// The window server's connection calls: who owns a window, where it lies in the stack and on the desktop.
 ///
@@ -42,6 +43,19 @@ CGError CGSGetOnScreenWindowList(CGSConnectionID connection, CGSConnectionID tar
 /// when they hold no more, and when another window server is in force.
 std::uint64_t PinnedWindowGeneration() noexcept;
 
+/// What questions of the calling thread are answered from: about windows from the list that it has pinned,
+/// about displays from that of the window server in force. Both never change, and are kept from being made
+/// anew in the same place; so where two moments are equal, with windows, every such question has the same
+/// answer in both.
+struct CGSMoment {
+    std::shared_ptr<const void> windows; ///< Null when the thread has pinned none, or they hold no more.
+    std::shared_ptr<const void> displays;
+
+    bool operator==(const CGSMoment&) const = default;
+};
+
+CGSMoment CGSPinnedMoment() noexcept;
+
 CGError CGSGetWindowLevel(CGSConnectionID connection, CGWindowID window, int* level) noexcept;
 
 /// From 0, fully transparent, to 1.
@@ -50,8 +64,25 @@ CGError CGSGetWindowAlpha(CGSConnectionID connection, CGWindowID window, float* 
 /// The visible frame, in global points.
 CGError CGSGetScreenRectForWindow(CGSConnectionID connection, CGWindowID window, CGRect* rect) noexcept;
 
+/// Whether anything of it may be in a picture.
+CGError CGSGetSharingState(CGSConnectionID connection, CGWindowID window,
+                           CGWindowSharingType* state) noexcept;
+
 /// The connection of the process that owns a window; kCGErrorFailure when its owner can't be told.
 CGError CGSGetWindowOwner(CGSConnectionID connection, CGWindowID window, CGSConnectionID* owner) noexcept;
+
+/// CGSGetWindowOwner for many windows at once: all answers are of one moment, that of the making, and nobody
+/// is asked for them.
+class CGSWindowOwners {
+public:
+    explicit CGSWindowOwners(CGSConnectionID connection) noexcept;
+
+    CGError Get(CGWindowID window, CGSConnectionID* owner) const noexcept;
+
+private:
+    const CGSConnectionID m_connection;
+    const std::shared_ptr<const void> m_windows;
+};
 
 /// The process behind a connection; kCGErrorInvalidConnection for what is none.
 CGError CGSConnectionGetPID(CGSConnectionID connection, pid_t* pid) noexcept;

@@ -150,22 +150,32 @@ int ShareCapturerContext::InitDisplays() {
 
 int ShareCapturerContext::AddSharedWindow(unsigned window) {
     return Add(m_paramLock, WINDOW, window, {"AddSharedWindow", m_vSharedWindows},
-               {"RemoveUnSharedWindow", m_vUnSharedWindows}, [this] { ++m_nAdmissions; });
+               {"RemoveUnSharedWindow", m_vUnSharedWindows}, [this] {
+                   ++m_nAdmissions;
+                   _NoteChange();
+               });
 }
 
 int ShareCapturerContext::RemoveSharedWindow(unsigned window) {
-    return Remove(m_paramLock, WINDOW, window, {"RemoveSharedWindow", m_vSharedWindows},
-                  [this] { ++m_nWithdrawals; });
+    return Remove(m_paramLock, WINDOW, window, {"RemoveSharedWindow", m_vSharedWindows}, [this] {
+        ++m_nWithdrawals;
+        _NoteChange();
+    });
 }
 
 int ShareCapturerContext::AddUnSharedWindow(unsigned window) {
     return Add(m_paramLock, WINDOW, window, {"AddUnSharedWindow", m_vUnSharedWindows},
-               {"RemoveSharedWindow", m_vSharedWindows}, [this] { ++m_nWithdrawals; });
+               {"RemoveSharedWindow", m_vSharedWindows}, [this] {
+                   ++m_nWithdrawals;
+                   _NoteChange();
+               });
 }
 
 int ShareCapturerContext::RemoveUnSharedWindow(unsigned window) {
-    return Remove(m_paramLock, WINDOW, window, {"RemoveUnSharedWindow", m_vUnSharedWindows},
-                  [this] { ++m_nAdmissions; });
+    return Remove(m_paramLock, WINDOW, window, {"RemoveUnSharedWindow", m_vUnSharedWindows}, [this] {
+        ++m_nAdmissions;
+        _NoteChange();
+    });
 }
 
 int ShareCapturerContext::AddSharedApp(unsigned pid) {
@@ -173,22 +183,30 @@ int ShareCapturerContext::AddSharedApp(unsigned pid) {
                {"RemoveUnSharedApp", m_vUnSharedApps}, [this] {
                    m_eShareType = SHARE_TYPE_APP;
                    ++m_nAdmissions;
+                   _NoteChange();
                });
 }
 
 int ShareCapturerContext::RemoveSharedApp(unsigned pid) {
-    return Remove(m_paramLock, PROCESS, pid, {"RemoveSharedApp", m_vSharedApps},
-                  [this] { ++m_nWithdrawals; });
+    return Remove(m_paramLock, PROCESS, pid, {"RemoveSharedApp", m_vSharedApps}, [this] {
+        ++m_nWithdrawals;
+        _NoteChange();
+    });
 }
 
 int ShareCapturerContext::AddUnSharedApp(unsigned pid) {
     return Add(m_paramLock, PROCESS, pid, {"AddUnSharedApp", m_vUnSharedApps},
-               {"RemoveSharedApp", m_vSharedApps}, [this] { ++m_nWithdrawals; });
+               {"RemoveSharedApp", m_vSharedApps}, [this] {
+                   ++m_nWithdrawals;
+                   _NoteChange();
+               });
 }
 
 int ShareCapturerContext::RemoveUnSharedApp(unsigned pid) {
-    return Remove(m_paramLock, PROCESS, pid, {"RemoveUnSharedApp", m_vUnSharedApps},
-                  [this] { ++m_nAdmissions; });
+    return Remove(m_paramLock, PROCESS, pid, {"RemoveUnSharedApp", m_vUnSharedApps}, [this] {
+        ++m_nAdmissions;
+        _NoteChange();
+    });
 }
 
 // ---- Displays: the list and the tables made from it change under one hold of the lock.
@@ -198,6 +216,7 @@ int ShareCapturerContext::AddSharedDisplay(unsigned display) {
         return SHARE_RESULT_INVALID_PARAM;
     const Guard lock(m_displayLock);
     if (const std::optional<std::size_t> before = Append(m_vSharedDisplays, display)) {
+        _NoteChange();
         TraceChange("AddSharedDisplay", DISPLAY, display, *before);
         InitDisplays();
     }
@@ -210,6 +229,7 @@ int ShareCapturerContext::RemoveSharedDisplay(unsigned display) {
     const Guard lock(m_displayLock);
     if (const std::optional<std::size_t> before = Erase(m_vSharedDisplays, display)) {
         ++m_nWithdrawals;
+        _NoteChange();
         TraceChange("RemoveSharedDisplay", DISPLAY, display, *before);
         InitDisplays();
     }
@@ -220,6 +240,7 @@ int ShareCapturerContext::ClearSharedDisplay() {
     const Guard lock(m_displayLock);
     m_vSharedDisplays.clear();
     ++m_nWithdrawals;
+    _NoteChange();
     return SHARE_RESULT_OK;
 }
 
@@ -245,6 +266,7 @@ int ShareCapturerContext::SetShareType(SHARE_TYPE type) {
     if (type == m_eShareType)
         return SHARE_RESULT_OK;
     m_eShareType = type;
+    _NoteChange();
     CmTraceInfo("ShareCapturerContext::SetShareType eShareType=", static_cast<int>(type));
     return SHARE_RESULT_OK;
 }

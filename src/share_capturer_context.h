@@ -34,6 +34,7 @@ public:
     /// Makes the tables of the shared displays anew. Called with or without m_displayLock, which is
     /// recursive.
     virtual int InitDisplays();
+    /// Has to give the same for a process until _NoteChange.
     virtual bool IsFilterOutSystemProcess(unsigned pid) const;
     /// Whether the window itself is on the shared list. The caller holds m_paramLock.
     virtual bool _IsWindowShared(unsigned window) const;
@@ -59,6 +60,10 @@ public:
     /// How often something was let in: shared, or no longer kept out. A picture of before may show what was
     /// not to be seen then.
     std::uint64_t Admissions() const { return m_nAdmissions.load(); }
+
+    /// Grows with every change of the lists, the share type and the displays. What was found out when it was
+    /// something else may be past.
+    std::uint64_t Revision() const { return m_nRevision.load(); }
 
     /// The share goes on after a time in which nobody was to see it.
     void NoteInterruption() { ++m_nInterruptions; }
@@ -104,12 +109,19 @@ public:
     /// that was made while the window server failed took the window for nobody's, whom nobody keeps out. True
     /// for one whose owner can't be told now or is kept out, unless the window itself is shared.
     bool MayBeKeptOut(unsigned window) const;
+    /// Leaves those of `windows` that IsWindowShared and not MayBeKeptOut, in their order. Judges all of them
+    /// by the windows of one moment and the lists of another one behind it.
+    void KeepShared(std::vector<int>& windows) const;
     /// Whether there may be something that a picture of a whole display must not show.
     bool KeepsOut() const;
     /// Doesn't look at the shared windows: a shared window of an application that isn't shared is both.
     bool IsWindowUnShared(unsigned window) const;
 
     // ---- What the last walk found.
+
+    /// How often a walk has published something else than what stood. While it is the same, so is all that
+    /// the operations below tell of the walk.
+    std::uint64_t Publications() const { return m_nPublications.load(); }
 
     /// The windows in the picture, top of the stack first. Of an application on several displays only those
     /// on its main display, and these are appended; otherwise `windows` is replaced.
@@ -165,6 +177,8 @@ protected:
     /// window that is on neither list is asked for in between, with no lock held, and the lists are then read
     /// again. The verdict is therefore that of one moment.
     bool __IsWindowShared(unsigned window) const;
+    /// The same. Clears `isSure` when the question for the owner failed, and it may be another's window.
+    bool __IsWindowShared(unsigned window, bool& isSure) const;
 
     /// What the lists of windows alone say of one; nothing when they leave it to the application. Takes
     /// m_paramLock.
@@ -174,13 +188,30 @@ protected:
     bool _IsAppUnShared(unsigned pid) const;
     bool _IsWindowUnShared(unsigned window) const;
 
+    /// Which displays count as those of a share of windows.
+    struct AppDisplayRule {
+        bool areAsSet;      ///< Those that were set, whatever the windows cover.
+        bool isByTopWindow; ///< The one of the frontmost window is the main one, else that with the largest
+                            ///< box.
+
+        /// As settings and flags have it.
+        static AppDisplayRule InForce();
+        bool operator==(const AppDisplayRule&) const = default;
+    };
+
+    /// What the client has set is another now. Behind the change, under its lock if it has one: who reads the
+    /// new revision reads the new values behind it.
+    void _NoteChange() { ++m_nRevision; }
+
     /// Works out which displays the share lies on, the main one first. On the thread of the walk, with no
-    /// lock held; with no display at all everything stays as it is.
-    void _UpdateAppsDisplay(ParamSet& found);
-    /// The box around what the windows have of a display; all zeros when they have nothing.
-    TVLRect _AppBoxOnDisplay(const TVLRect& display, const TVLRegion& applications) const;
-    /// Publishes a walk.
-    void _CommitParamSet(ParamSet& found);
+    /// lock held; with no display at all everything stays as it is. False when a question about them failed
+    /// or there was no memory, so that it may be otherwise.
+    bool _UpdateAppsDisplay(ParamSet& found, const AppDisplayRule& rule);
+    /// The box around what the windows have of a display; all zeros when they have nothing. Clears `isSure`
+    /// when there is no memory to find out.
+    TVLRect _AppBoxOnDisplay(const TVLRect& display, const TVLRegion& applications, bool& isSure) const;
+    /// Publishes a walk. False when there was no memory for all of it.
+    bool _CommitParamSet(ParamSet& found);
 
     ShareRelaxed<bool> m_bFilterSelf{false};
     ShareRelaxedSize m_sizeCaptureMax;
@@ -190,6 +221,8 @@ protected:
     std::atomic<std::uint64_t> m_nWithdrawals{0};
     std::atomic<std::uint64_t> m_nAdmissions{0};
     std::atomic<std::uint64_t> m_nInterruptions{0};
+    std::atomic<std::uint64_t> m_nRevision{0};
+    std::atomic<std::uint64_t> m_nPublications{0};
     std::vector<unsigned> m_vSharedWindows;
     std::vector<unsigned> m_vUnSharedWindows;
     std::vector<unsigned> m_vSharedApps;

@@ -1,4 +1,5 @@
 // SPDX-License-Identifier: Apache-2.0
+#include "platform/core_graphics.h"
 #include "platform/window_services.h"
 #include "src/app_share_config.h"
 #include "src/mac/share_util_mac.h"
@@ -7,6 +8,8 @@
 #include "util/cm_trace.h"
 
 #include <algorithm>
+#include <cstdint>
+#include <optional>
 #include <string>
 #include <utility>
 
@@ -35,6 +38,22 @@ private:
     unsigned m_display = SHARE_INVALID_DISPLAY;
     TVLRect m_box{};
 };
+
+/// Whether a list of displays has all of them, each with a place.
+bool AreAllDisplays(const std::vector<ShareDisplayPlace>& displays) {
+    std::uint32_t count = 0;
+    return platform::CGGetOnlineDisplayList(0, nullptr, &count) == platform::kCGErrorSuccess &&
+           count == displays.size() &&
+           std::none_of(displays.begin(), displays.end(), [](const ShareDisplayPlace& display) {
+               return display.rect.left == display.rect.right || display.rect.top == display.rect.bottom;
+           });
+}
+
+/// Regions that were to be copied without memory have none.
+bool HasShape(const TVLRegion& region) {
+    TVLRect box{};
+    return region.GetRgnBox(box);
+}
 
 void PutFirst(std::vector<unsigned>& displays, unsigned display) {
     const auto place = std::find(displays.begin(), displays.end(), display);
@@ -67,6 +86,26 @@ bool ShareCapturerContext::MayBeKeptOut(unsigned window) const {
         return false;
     const Guard lock(m_paramLock);
     return !Contains(m_vSharedWindows, window);
+}
+
+void ShareCapturerContext::KeepShared(std::vector<int>& windows) const {
+    const platform::CGSWindowOwners owners(platform::CGSDefaultConnection());
+    const auto isKeptOut = [&](int id) {
+        const auto window = static_cast<unsigned>(id);
+        if (_IsWindowUnShared(window) || _IsWindowShared(window))
+            return _IsWindowUnShared(window);
+        platform::CGSConnectionID owner = 0;
+        pid_t pid = 0;
+        const platform::CGError error = owners.Get(window, &owner);
+        if (error == platform::kCGErrorFailure)
+            return !_IsAppShared(SHARE_INVALID_PROCESS); // really nobody's
+        // Whose a window is that nothing is known of can't be told, so it may be somebody's who is kept out.
+        return error != platform::kCGErrorSuccess ||
+               platform::CGSConnectionGetPID(owner, &pid) != platform::kCGErrorSuccess ||
+               !_IsAppShared(static_cast<unsigned>(pid)) || _IsAppUnShared(static_cast<unsigned>(pid));
+    };
+    const Guard lock(m_paramLock);
+    windows.erase(std::remove_if(windows.begin(), windows.end(), isKeptOut), windows.end());
 }
 
 bool ShareCapturerContext::KeepsOut() const {
@@ -105,9 +144,15 @@ std::optional<bool> ShareCapturerContext::_WindowListsVerdict(unsigned window) c
 }
 
 bool ShareCapturerContext::__IsWindowShared(unsigned window) const {
+    bool isSure = true;
+    return __IsWindowShared(window, isSure);
+}
+
+bool ShareCapturerContext::__IsWindowShared(unsigned window, bool& isSure) const {
     if (const std::optional<bool> verdict = _WindowListsVerdict(window))
         return *verdict;
-    const unsigned pid = ShareUtil::GetPIDOfWindowHandle(window);
+    unsigned pid = SHARE_INVALID_PROCESS;
+    isSure = ShareUtil::FindPIDOfWindowHandle(window, pid) && isSure;
     // The lists may have changed meanwhile. If only the application's were read here, a window that a client
     // has just taken over from an unshared application to the unshared windows would pass between the two.
     const Guard lock(m_paramLock);
@@ -161,39 +206,49 @@ int ShareCapturerContext::GetCapturedWindows(std::vector<unsigned>& windows) con
     return SHARE_RESULT_OK;
 }
 
-void ShareCapturerContext::_UpdateAppsDisplay(ParamSet& found) {
+ShareCapturerContext::AppDisplayRule ShareCapturerContext::AppDisplayRule::InForce() {
     const AppShareConfig& config = *AppShareConfig::Instance();
-    if (m_eShareType == SHARE_TYPE_DESKTOP ||
-        (config.m_nShareConfigFlags & SHARE_CONFIG_FLAG_APP_DISPLAYS_AS_SET) != 0) {
+    return {(config.m_nShareConfigFlags & SHARE_CONFIG_FLAG_APP_DISPLAYS_AS_SET) != 0,
+            config.m_bAppDisplayByWindow};
+}
+
+bool ShareCapturerContext::_UpdateAppsDisplay(ParamSet& found, const AppDisplayRule& rule) {
+    if (m_eShareType == SHARE_TYPE_DESKTOP || rule.areAsSet) {
         const Guard lock(m_displayLock);
         found.vAppDisplays = m_vSharedDisplays;
         m_mapAppDisplayRects = m_mapDisplayRects;
-        return;
+        return true;
     }
     const std::vector<ShareDisplayPlace> displays = ListDisplayPlaces();
     if (displays.empty())
-        return;
+        return false;
+    bool isSure = AreAllDisplays(displays);
     std::map<unsigned, TVLRect> rects;
     std::vector<unsigned> covered;
     BestDisplay best;
     for (const ShareDisplayPlace& display : displays) {
         rects[display.id] = display.rect;
-        const TVLRect box = _AppBoxOnDisplay(display.rect, found.rgnApplications);
+        const TVLRect box = _AppBoxOnDisplay(display.rect, found.rgnApplications, isSure);
         best.Consider(display.id, box);
         if (box.right > box.left && box.bottom > box.top)
             covered.push_back(display.id);
     }
     m_mapAppDisplayRects.swap(rects);
     found.vAppDisplays.swap(covered);
-    if (!config.m_bAppDisplayByWindow)
+    if (!rule.isByTopWindow) {
         PutFirst(found.vAppDisplays, best.Id());
-    else if (const unsigned top = m_nTopAppWindow; top != SHARE_INVALID_WINDOW)
-        PutFirst(found.vAppDisplays, ShareUtil::GetWindowDisplayID(top));
+    } else if (const unsigned top = m_nTopAppWindow; top != SHARE_INVALID_WINDOW) {
+        const std::optional<unsigned> display = FindWindowDisplay(top, displays);
+        isSure = isSure && display;
+        PutFirst(found.vAppDisplays, display.value_or(displays.front().id));
+    }
+    return isSure;
 }
 
-TVLRect ShareCapturerContext::_AppBoxOnDisplay(const TVLRect& display, const TVLRegion& applications) const {
+TVLRect ShareCapturerContext::_AppBoxOnDisplay(const TVLRect& display, const TVLRegion& applications,
+                                               bool& isSure) const {
     TVLRegion onDisplay;
-    onDisplay.AddRect(display);
+    isSure = onDisplay.AddRect(display) && isSure;
     if (CmTraceOn(CM_TRACE_DETAIL)) {
         TVLRegion published;
         {
@@ -204,7 +259,7 @@ TVLRect ShareCapturerContext::_AppBoxOnDisplay(const TVLRect& display, const TVL
                       ",rcDisplay=", ShareUtil::TVLRectToString(display),
                       ",rgnOneDisplay=", onDisplay.ToString(), ",m_rgnApplications=", published.ToString());
     }
-    onDisplay.CombineRgn(applications, REGION_COMBINE_AND);
+    isSure = onDisplay.CombineRgn(applications, REGION_COMBINE_AND) && isSure;
     if (CmTraceOn(CM_TRACE_DETAIL))
         CmTraceDetail("ShareCapturerContext::_UpdateAppsDisplay after AND",
                       ",rgnOneDisplay=", onDisplay.ToString());
@@ -213,8 +268,9 @@ TVLRect ShareCapturerContext::_AppBoxOnDisplay(const TVLRect& display, const TVL
     return box;
 }
 
-void ShareCapturerContext::_CommitParamSet(ParamSet& found) {
+bool ShareCapturerContext::_CommitParamSet(ParamSet& found) {
     bool isOnOtherDisplays = false;
+    bool isWhole = true;
     {
         const Guard lock(m_paramLock);
         m_rgnOverlap.CopyRgn(found.rgnOverlap);
@@ -222,17 +278,22 @@ void ShareCapturerContext::_CommitParamSet(ParamSet& found) {
         m_rgnSharedWindow.CopyRgn(found.rgnSharedWindow);
         m_rgnApplications.CopyRgn(found.rgnApplications);
         m_rgnExposed.CopyRgn(found.rgnExposed);
+        for (const TVLRegion* region :
+             {&m_rgnOverlap, &m_rgnVisible, &m_rgnSharedWindow, &m_rgnApplications, &m_rgnExposed})
+            isWhole = HasShape(*region) && isWhole;
         m_vCapturedWindows.swap(found.vCapturedWindows);
         m_vCapturedExcludedWindows.swap(found.vCapturedExcludedWindows);
         isOnOtherDisplays = m_vAppDisplays != found.vAppDisplays;
         m_vAppDisplays.swap(found.vAppDisplays);
+        ++m_nPublications;
     }
     if (!isOnOtherDisplays)
-        return;
+        return isWhole;
     std::vector<unsigned> displays;
     GetAppMonitors(displays);
     std::string text;
     for (const unsigned display : displays)
         text += std::to_string(display) + ",";
     CmTraceDetail("ShareCapturerContext::_CommitParamSet, shared display:", text);
+    return isWhole;
 }

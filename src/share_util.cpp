@@ -29,13 +29,24 @@ TVLRect ShareUtil::Intersect(const TVLRect& a, const TVLRect& b) {
 }
 
 unsigned ShareUtil::GetPIDOfWindowHandle(unsigned window) {
-    const platform::CGSConnectionID connection = platform::CGSDefaultConnection();
+    unsigned pid = SHARE_INVALID_PROCESS;
+    FindPIDOfWindowHandle(window, pid);
+    return pid;
+}
+
+bool ShareUtil::FindPIDOfWindowHandle(unsigned window, unsigned& pid) {
+    pid = SHARE_INVALID_PROCESS;
     platform::CGSConnectionID owner = 0;
-    pid_t pid = 0;
-    if (platform::CGSGetWindowOwner(connection, window, &owner) != platform::kCGErrorSuccess ||
-        platform::CGSConnectionGetPID(owner, &pid) != platform::kCGErrorSuccess)
-        return SHARE_INVALID_PROCESS;
-    return static_cast<unsigned>(pid);
+    const platform::CGError error =
+        platform::CGSGetWindowOwner(platform::CGSDefaultConnection(), window, &owner);
+    if (error == platform::kCGErrorFailure)
+        return true;
+    pid_t process = 0;
+    if (error != platform::kCGErrorSuccess ||
+        platform::CGSConnectionGetPID(owner, &process) != platform::kCGErrorSuccess)
+        return false;
+    pid = static_cast<unsigned>(process);
+    return true;
 }
 
 void ShareUtil::GetWindowRect(unsigned window, TVLRect& rect) {

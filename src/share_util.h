@@ -27,6 +27,8 @@ public:
 
     /// The owner's process id; 0x80000000 when it can't be found.
     static unsigned GetPIDOfWindowHandle(unsigned window);
+    /// The same, and false when the question failed: a window of nobody's is an answer.
+    static bool FindPIDOfWindowHandle(unsigned window, unsigned& pid);
 
     /// The window's frame in global points, all zeros when there is no such window.
     static void GetWindowRect(unsigned window, TVLRect& rect);

@@ -10,6 +10,7 @@
 #include "util/cm_trace.h"
 
 #include <algorithm>
+#include <utility>
 
 /// The walk over the windows. The display tables are in share_capturer_context_mac_displays.cpp.
 
@@ -61,9 +62,20 @@ struct ShareCapturerContextMac::Walk {
     TVLRegion rgnDisplay;
     MenuBarRule menuBars;
     bool isWhole = true; // false once a region could not be changed for want of memory
+    bool isSure = true;  // false once a question was not answered
 
     void Need(bool done) { isWhole = isWhole && done; }
+    /// Whether the question that gave `error` was answered.
+    bool Told(platform::CGError error) {
+        isSure = isSure && error == platform::kCGErrorSuccess;
+        return error == platform::kCGErrorSuccess;
+    }
     bool IsDesktop() const { return shareType == SHARE_TYPE_DESKTOP; }
+    TVLRect DockBar(unsigned display) {
+        platform::CGRect bar;
+        isSure = ShareUtilMac::FindDockBarRect(display, bar) && isSure;
+        return ShareUtilMac::CGRectToTVLRect(bar);
+    }
 };
 
 struct ShareCapturerContextMac::WalkedWindow {
@@ -72,16 +84,16 @@ struct ShareCapturerContextMac::WalkedWindow {
     int winLevel = -1;
     TVLRect rcWindow{};
 
-    float Alpha(platform::CGSConnectionID connection) const {
+    float Alpha(Walk& walk) const {
         float alpha = 1.0F;
-        platform::CGSGetWindowAlpha(connection, id, &alpha);
+        walk.Told(platform::CGSGetWindowAlpha(walk.connection, id, &alpha));
         return alpha;
     }
     /// Whether anything of it is in a picture of its display.
-    bool GivesPixels() const {
-        const auto descriptions = platform::CGWindowListCreateDescriptionFromArray({&id, 1});
-        return !descriptions.empty() &&
-               descriptions.front().kCGWindowSharingState != platform::kCGWindowSharingNone;
+    bool GivesPixels(Walk& walk) const {
+        platform::CGWindowSharingType state = platform::kCGWindowSharingNone;
+        return walk.Told(platform::CGSGetSharingState(walk.connection, id, &state)) &&
+               state != platform::kCGWindowSharingNone;
     }
     bool IsDock() const { return winLevel == platform::CGWindowLevelForKey(platform::kCGDockWindowLevelKey); }
 };
@@ -90,22 +102,53 @@ int ShareCapturerContextMac::UpdateShareCapturerContext() {
     const unsigned flags = AppShareConfig::Instance()->m_nShareConfigFlags;
     if ((flags & SHARE_CONFIG_FLAG_NO_WINDOW_WALK) != 0) {
         m_nWalkedGeneration = 0;
+        m_lastWalk.reset();
         return SHARE_RESULT_OK;
     }
     ShareDumpTimeUsage total;
+    ShareDumpTimeUsage listing;
+    WalkInputs inputs = _ReadInputs();
+    ShareUtilMac::GetOnScreenWindowList(m_vOnScreen);
+    const int listingTime = listing.Stop();
+    inputs.moment = platform::CGSPinnedMoment();
+    if (!_LastWalkStands(inputs)) {
+        m_lastWalk.reset();
+        if (_WalkOnScreen(inputs, listingTime))
+            m_lastWalk = std::move(inputs);
+    }
+    if ((flags & SHARE_CONFIG_FLAG_PERFORMANCE_TRACE) != 0)
+        CmTraceInfo("[Performance] UpdateShareCapturerContext total usageTime=", total.Stop());
+    return SHARE_RESULT_FAILED;
+}
+
+ShareCapturerContextMac::WalkInputs ShareCapturerContextMac::_ReadInputs() const {
+    WalkInputs inputs;
+    inputs.revision =
+        Revision(); // first: what is read behind it may be newer, and the next walk is made then
+    inputs.excludesMenuBars = !m_bNoWindowBaseArea && m_bExcludeMenuBar;
+    inputs.findsExposed = m_bFindsExposed;
+    inputs.appDisplayRule = AppDisplayRule::InForce();
+    if (inputs.excludesMenuBars)
+        inputs.menuBarDisplays = m_mapAppDisplayRects;
+    return inputs;
+}
+
+bool ShareCapturerContextMac::_LastWalkStands(const WalkInputs& inputs) const {
+    return m_lastWalk && *m_lastWalk == inputs && !CmTraceOn(CM_TRACE_DEBUG);
+}
+
+bool ShareCapturerContextMac::_WalkOnScreen(const WalkInputs& inputs, int listingTime) {
     ShareDumpTimeUsage step;
-    Walk walk = _BeginWalk();
-    std::vector<int> windows;
-    ShareUtilMac::GetOnScreenWindowList(windows);
+    Walk walk = _BeginWalk(inputs);
     const std::uint64_t generation = platform::PinnedWindowGeneration();
     CmTraceDetail("ShareCapturerContextMac::UpdateShareCapturerContext begin >> WindowsCount=",
-                  windows.size());
-    CmTraceDetail("UpdateShareCapturerContext init usageTime=", step.Stop());
+                  m_vOnScreen.size());
+    CmTraceDetail("UpdateShareCapturerContext init usageTime=", listingTime);
 
     CmTraceDetail("check windows: start >> ");
     m_paramSet.reset();
     m_nTopAppWindow = SHARE_INVALID_WINDOW;
-    for (auto window = windows.rbegin(); window != windows.rend(); ++window)
+    for (auto window = m_vOnScreen.rbegin(); window != m_vOnScreen.rend(); ++window)
         _WalkWindow(walk, static_cast<unsigned>(*window));
     step.Start();
 
@@ -123,21 +166,20 @@ int ShareCapturerContextMac::UpdateShareCapturerContext() {
     m_nWalkedGeneration = walk.isWhole && isOfOneMoment ? generation : 0;
     if (!walk.isWhole)
         _ShowNothing();
-    _UpdateAppsDisplay(m_paramSet);
+    const bool areDisplaysSure = _UpdateAppsDisplay(m_paramSet, inputs.appDisplayRule);
     CmTraceDetail("UpdateShareCapturerContext _UpdateAppsDisplay windows usageTime=", step.Stop());
-    _CommitParamSet(m_paramSet);
+    const bool isPublished = _CommitParamSet(m_paramSet);
     _TraceFound();
-    if ((flags & SHARE_CONFIG_FLAG_PERFORMANCE_TRACE) != 0)
-        CmTraceInfo("[Performance] UpdateShareCapturerContext total usageTime=", total.Stop());
-    return SHARE_RESULT_FAILED;
+    return walk.isWhole && walk.isSure && isOfOneMoment && areDisplaysSure && isPublished &&
+           inputs.moment.windows != nullptr && platform::CGSPinnedMoment() == inputs.moment;
 }
 
-ShareCapturerContextMac::Walk ShareCapturerContextMac::_BeginWalk() const {
+ShareCapturerContextMac::Walk ShareCapturerContextMac::_BeginWalk(const WalkInputs& inputs) const {
     Walk walk;
     walk.connection = platform::CGSDefaultConnection();
     walk.shareType = m_eShareType;
-    walk.excludesMenuBars = !walk.IsDesktop() && !m_bNoWindowBaseArea && m_bExcludeMenuBar;
-    walk.findsExposed = m_bFindsExposed;
+    walk.excludesMenuBars = !walk.IsDesktop() && inputs.excludesMenuBars;
+    walk.findsExposed = inputs.findsExposed;
     const Guard lock(m_displayLock);
     walk.displays = m_vSharedDisplays;
     walk.rgnDisplay.CopyRgn(m_rgnDisplay);
@@ -147,20 +189,20 @@ ShareCapturerContextMac::Walk ShareCapturerContextMac::_BeginWalk() const {
 void ShareCapturerContextMac::_WalkWindow(Walk& walk, unsigned id) {
     WalkedWindow window;
     window.id = id;
-    window.bShared = __IsWindowShared(id);
-    platform::CGSGetWindowLevel(walk.connection, id, &window.winLevel);
+    window.bShared = __IsWindowShared(id, walk.isSure);
+    walk.Told(platform::CGSGetWindowLevel(walk.connection, id, &window.winLevel));
     platform::CGRect frame;
     if (!walk.IsDesktop() && (window.IsDock() || ShareUtilMac::need_skip_window(id, window.winLevel))) {
         CmTraceDetail("check windows:", ",bShared=", window.bShared, ",oneWindow=", id,
                       ",winLevel=", window.winLevel, ",Skip");
         if (walk.findsExposed &&
-            platform::CGSGetScreenRectForWindow(walk.connection, id, &frame) == platform::kCGErrorSuccess) {
+            walk.Told(platform::CGSGetScreenRectForWindow(walk.connection, id, &frame))) {
             window.rcWindow = ShareUtilMac::CGRectToTVLRect(frame);
             _Expose(walk, window);
         }
         return;
     }
-    platform::CGSGetScreenRectForWindow(walk.connection, id, &frame);
+    walk.Told(platform::CGSGetScreenRectForWindow(walk.connection, id, &frame));
     window.rcWindow = ShareUtilMac::CGRectToTVLRect(frame);
 
     bool isKept = window.bShared;
@@ -179,7 +221,7 @@ void ShareCapturerContextMac::_KeepWindow(Walk& walk, WalkedWindow& window) {
     m_paramSet.vCapturedWindows.push_back(window.id);
     // The Dock's window is larger than what it draws.
     if (walk.IsDesktop() && window.IsDock() && !walk.displays.empty())
-        window.rcWindow = ShareUtilMac::CGRectToTVLRect(ShareUtilMac::GetDockBarRect(walk.displays.front()));
+        window.rcWindow = walk.DockBar(walk.displays.front());
     walk.Need(m_paramSet.rgnVisible.AddRect(window.rcWindow));
     walk.Need(m_paramSet.rgnOverlap.ExcludeRect(window.rcWindow));
     _CoverExposed(walk, window);
@@ -193,20 +235,20 @@ void ShareCapturerContextMac::_KeepOutWindow(Walk& walk, const WalkedWindow& win
     walk.Need(hidden.CombineRgn(m_paramSet.rgnVisible, REGION_COMBINE_AND));
     if (hidden.IsEmpty())
         return;
-    if (window.Alpha(walk.connection) > 0)
+    if (window.Alpha(walk) > 0)
         _HideVisible(walk, hidden);
 }
 
 void ShareCapturerContextMac::_Expose(Walk& walk, const WalkedWindow& window) {
-    if (walk.findsExposed && window.Alpha(walk.connection) > 0)
+    if (walk.findsExposed && window.Alpha(walk) > 0)
         walk.Need(m_paramSet.rgnExposed.AddRect(window.rcWindow));
 }
 
 void ShareCapturerContextMac::_CoverExposed(Walk& walk, const WalkedWindow& window) {
     if (!walk.findsExposed || m_paramSet.rgnExposed.IsEmpty())
         return;
-    const bool isOpaque = !walk.IsDesktop() || window.Alpha(walk.connection) >= 1.0F;
-    if (isOpaque && window.GivesPixels())
+    const bool isOpaque = !walk.IsDesktop() || window.Alpha(walk) >= 1.0F;
+    if (isOpaque && window.GivesPixels(walk))
         walk.Need(m_paramSet.rgnExposed.ExcludeRect(window.rcWindow));
 }
 
@@ -218,7 +260,7 @@ void ShareCapturerContextMac::_HideVisible(Walk& walk, const TVLRegion& hidden) 
 void ShareCapturerContextMac::_HideDocks(Walk& walk) {
     for (const unsigned display : walk.displays) {
         TVLRegion hidden;
-        walk.Need(hidden.AddRect(ShareUtilMac::CGRectToTVLRect(ShareUtilMac::GetDockBarRect(display))));
+        walk.Need(hidden.AddRect(walk.DockBar(display)));
         walk.Need(hidden.CombineRgn(m_paramSet.rgnVisible, REGION_COMBINE_AND));
         _HideVisible(walk, hidden);
     }

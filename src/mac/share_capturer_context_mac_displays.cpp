@@ -76,6 +76,7 @@ int ShareCapturerContextMac::InitDisplays() {
     m_mapDisplaySizes.swap(sizes);
     m_mapDisplayRects.swap(rects);
     m_rgnDisplay = std::move(region);
+    _NoteChange();
     return SHARE_RESULT_OK;
 }
 

@@ -21,6 +21,7 @@ ShareUtilMacMonitorDraging::~ShareUtilMacMonitorDraging() = default;
 
 void ShareUtilMacMonitorDraging::SetContext(const std::shared_ptr<ShareCapturerContext>& context) {
     m_shareCapturerContext = context;
+    m_nPublicationsSeen.reset();
 }
 
 bool ShareUtilMacMonitorDraging::IsDraging(const std::function<void()>& update) {
@@ -43,15 +44,21 @@ bool ShareUtilMacMonitorDraging::IsDraging(const std::function<void()>& update) 
 bool ShareUtilMacMonitorDraging::IsVisiableRegionChanged() {
     if (m_shareCapturerContext == nullptr)
         return false;
+    const std::uint64_t publications = m_shareCapturerContext->Publications();
+    if (m_nPublicationsSeen == publications)
+        return false;
     TVLRegion visible;
     m_shareCapturerContext->GetVisiableRegion(visible);
-    if (m_bFirstChecking) {
-        m_bFirstChecking = false;
-        m_rgnVisibleCache.CopyRgn(visible);
-        return false;
-    }
-    if (m_rgnVisibleCache.AllRects() == visible.AllRects())
-        return false;
+    const bool isOther = !m_bFirstChecking && m_rgnVisibleCache.AllRects() != visible.AllRects();
+    m_bFirstChecking = false;
+    Remember(visible, publications);
+    return isOther;
+}
+
+void ShareUtilMacMonitorDraging::Remember(const TVLRegion& visible, std::uint64_t publications) {
+    m_nPublicationsSeen.reset();
     m_rgnVisibleCache.CopyRgn(visible);
-    return true;
+    TVLRect box{};
+    if (m_rgnVisibleCache.GetRgnBox(box)) // without memory it would be no copy
+        m_nPublicationsSeen = publications;
 }

@@ -3,8 +3,10 @@
 
 #include "src/share_region.h"
 
+#include <cstdint>
 #include <functional>
 #include <memory>
+#include <optional>
 
 class ShareCapturerContext;
 
@@ -30,9 +32,13 @@ public:
     bool IsVisiableRegionChanged();
 
 private:
+    void Remember(const TVLRegion& visible, std::uint64_t publications);
+
     /// Milliseconds; 0 while nothing moves.
     unsigned long m_tickOnInvisibleRegionChanged = 0;
     std::shared_ptr<ShareCapturerContext> m_shareCapturerContext;
     bool m_bFirstChecking = true;
+    /// ShareCapturerContext::Publications when the cache was what is visible; nothing when that isn't known.
+    std::optional<std::uint64_t> m_nPublicationsSeen;
     TVLRegion m_rgnVisibleCache;
 };

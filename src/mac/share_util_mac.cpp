@@ -39,6 +39,23 @@ private:
     int m_area = 0;
 };
 
+bool FindWindowRect(unsigned window, TVLRect& rect) {
+    platform::CGRect frame;
+    if (platform::CGSGetScreenRectForWindow(platform::CGSDefaultConnection(), window, &frame) !=
+        platform::kCGErrorSuccess)
+        return false;
+    rect = ShareUtilMac::CGRectToTVLRect(frame);
+    return true;
+}
+
+unsigned LargestPieceOf(const TVLRect& rect, const std::vector<ShareDisplayPlace>& displays,
+                        unsigned displayWhenNone) {
+    LargestPiece largest(displayWhenNone);
+    for (const ShareDisplayPlace& display : displays)
+        largest.Consider(display.id, display.rect, rect);
+    return largest.Display();
+}
+
 /// 0 when the process has none.
 platform::CGSConnectionID ConnectionOfProcess(int pid) {
     platform::ProcessSerialNumber process;
@@ -134,21 +151,30 @@ platform::CGRect ShareUtilMac::GetMenuBarRect(unsigned display) {
 }
 
 platform::CGRect ShareUtilMac::GetDockBarRect(unsigned display) {
+    platform::CGRect bar;
+    FindDockBarRect(display, bar);
+    return bar;
+}
+
+bool ShareUtilMac::FindDockBarRect(unsigned display, platform::CGRect& bar) {
+    bar = {};
     const std::optional<platform::NSScreen> screen = CMonitorEnumMac::screenForDisplayID(display);
     if (!screen)
-        return {};
+        return false;
     const platform::CGRect visible = screen->visibleFrame();
     const platform::CGRect bounds = platform::CGDisplayBounds(display);
+    const float mainHeight = platform::CGDisplayBounds(platform::CGMainDisplayID()).size.height;
     // A screen counts from the bottom of the main display, the window server from its top.
-    const float top = platform::CGDisplayBounds(platform::CGMainDisplayID()).size.height - visible.origin.y -
-                      visible.size.height;
+    const float top = mainHeight - visible.origin.y - visible.size.height;
     if (visible.size.width != bounds.size.width) {
         const bool isAtTheRight = visible.origin.x == bounds.origin.x;
-        return {{isAtTheRight ? visible.origin.x + visible.size.width : bounds.origin.x, top},
-                {bounds.size.width - visible.size.width, visible.size.height}};
+        bar = {{isAtTheRight ? visible.origin.x + visible.size.width : bounds.origin.x, top},
+               {bounds.size.width - visible.size.width, visible.size.height}};
+    } else {
+        const float y = top + visible.size.height;
+        bar = {{bounds.origin.x, y}, {bounds.size.width, bounds.origin.y + bounds.size.height - y}};
     }
-    const float y = top + visible.size.height;
-    return {{bounds.origin.x, y}, {bounds.size.width, bounds.origin.y + bounds.size.height - y}};
+    return bounds.size.width > 0 && mainHeight > 0;
 }
 
 std::vector<ShareDisplayPlace> ListDisplayPlaces() {
@@ -197,13 +223,14 @@ unsigned GetAppDisplayID(int pid) {
 
 unsigned GetWindowDisplayID(unsigned window) {
     const unsigned mainDisplay = platform::CGMainDisplayID();
-    platform::CGRect frame;
-    if (platform::CGSGetScreenRectForWindow(platform::CGSDefaultConnection(), window, &frame) !=
-        platform::kCGErrorSuccess)
-        return mainDisplay;
-    const TVLRect rect = ShareUtilMac::CGRectToTVLRect(frame);
-    LargestPiece largest(mainDisplay);
-    for (const ShareDisplayPlace& display : ListDisplayPlaces())
-        largest.Consider(display.id, display.rect, rect);
-    return largest.Display();
+    TVLRect rect{};
+    return FindWindowRect(window, rect) ? LargestPieceOf(rect, ListDisplayPlaces(), mainDisplay)
+                                        : mainDisplay;
+}
+
+std::optional<unsigned> FindWindowDisplay(unsigned window, const std::vector<ShareDisplayPlace>& displays) {
+    TVLRect rect{};
+    if (displays.empty() || !FindWindowRect(window, rect))
+        return std::nullopt;
+    return LargestPieceOf(rect, displays, displays.front().id);
 }

@@ -49,6 +49,8 @@ public:
     /// The edge that is kept free for a dock, at the right, the left or the bottom; its height is 0 when
     /// there is none.
     static platform::CGRect GetDockBarRect(unsigned display);
+    /// The same, and false when the display isn't known: whether there is a dock can't be told then.
+    static bool FindDockBarRect(unsigned display, platform::CGRect& bar);
 
     // ---- Pixels, in share_util_mac_frame.cpp
 
@@ -86,5 +88,9 @@ std::vector<ShareDisplayPlace> ListDisplayPlaces();
 /// The display that holds the largest piece of any one window of the application.
 unsigned GetAppDisplayID(int pid);
 
-/// The display that holds the largest piece of the window.
+/// The display that holds the largest piece of the window, the main one of a window that isn't there.
 unsigned GetWindowDisplayID(unsigned window);
+
+/// The same among those displays, of which the first one is the main one; nothing for a window that isn't
+/// there.
+std::optional<unsigned> FindWindowDisplay(unsigned window, const std::vector<ShareDisplayPlace>& displays);

@@ -299,6 +299,66 @@ TEST_F(WindowServices, TellNoGenerationOfAnotherServersMoment) {
     EXPECT_EQ(PinnedWindowGeneration(), next->GetWindows()->Generation());
 }
 
+TEST_F(WindowServices, KnowAMomentAgainWhileNothingIsToldOtherwise) {
+    List();
+    const CGSMoment first = CGSPinnedMoment();
+    EXPECT_NE(first.windows, nullptr);
+    List();
+    EXPECT_EQ(CGSPinnedMoment(), first);
+    m_server->SetWindows({FakeWindow(1, 500, FRAME)});
+    EXPECT_EQ(CGSPinnedMoment(), first) << "pinned";
+    List();
+    const CGSMoment second = CGSPinnedMoment();
+    EXPECT_FALSE(second == first);
+    m_server->SetDisplays({FakeDisplay(1, {{0, 0}, {200, 120}})});
+    EXPECT_FALSE(CGSPinnedMoment() == second) << "displays aren't pinned";
+}
+
+TEST_F(WindowServices, HaveNoWindowsOfAMomentThatHoldsNoMore) {
+    EXPECT_EQ(CGSPinnedMoment().windows, nullptr);
+    List();
+    m_clock->Advance(100ms);
+    EXPECT_EQ(CGSPinnedMoment().windows, nullptr);
+    List();
+    EXPECT_NE(CGSPinnedMoment().windows, nullptr);
+    m_server->SetLife(Life::Lost);
+    int read = 0;
+    CGSGetOnScreenWindowList(CGSDefaultConnection(), 0, 0, nullptr, &read);
+    EXPECT_EQ(CGSPinnedMoment().windows, nullptr);
+}
+
+TEST_F(WindowServices, TellWhetherAWindowGivesItsPixels) {
+    WindowInfo secret = FakeWindow(2, 500, FRAME);
+    secret.sharing = SharingState::None;
+    m_server->SetWindows({FakeWindow(1, 500, FRAME), secret});
+    CGWindowSharingType state = kCGWindowSharingReadWrite;
+    EXPECT_EQ(CGSGetSharingState(CGSDefaultConnection(), 2, &state), kCGErrorSuccess);
+    EXPECT_EQ(state, kCGWindowSharingNone);
+    EXPECT_EQ(CGSGetSharingState(CGSDefaultConnection(), 1, &state), kCGErrorSuccess);
+    EXPECT_EQ(state, kCGWindowSharingReadOnly);
+    EXPECT_EQ(CGSGetSharingState(CGSDefaultConnection(), 9, &state), kCGErrorIllegalArgument);
+    EXPECT_EQ(CGSGetSharingState(0, 1, &state), kCGErrorInvalidConnection);
+    EXPECT_EQ(CGSGetSharingState(CGSDefaultConnection(), 1, nullptr), kCGErrorIllegalArgument);
+}
+
+TEST_F(WindowServices, TellTheOwnersOfManyWindowsAsOfOneMoment) {
+    const CGSWindowOwners owners(CGSDefaultConnection());
+    const CGSWindowOwners nobodys(0);
+    CGSConnectionID expected = 0;
+    ASSERT_EQ(CGSGetWindowOwner(CGSDefaultConnection(), 3, &expected), kCGErrorSuccess);
+    m_server->SetWindows({});
+    const int asked = m_server->calls.windows;
+    CGSConnectionID owner = 7;
+    EXPECT_EQ(owners.Get(4, &owner), kCGErrorFailure) << "nobody's";
+    EXPECT_EQ(owners.Get(9, &owner), kCGErrorIllegalArgument) << "not there";
+    EXPECT_EQ(owners.Get(3, nullptr), kCGErrorIllegalArgument);
+    EXPECT_EQ(nobodys.Get(3, &owner), kCGErrorInvalidConnection);
+    EXPECT_EQ(owner, 7u);
+    EXPECT_EQ(owners.Get(3, &owner), kCGErrorSuccess);
+    EXPECT_EQ(owner, expected);
+    EXPECT_EQ(m_server->calls.windows, asked) << "nobody is asked";
+}
+
 TEST_F(WindowServices, LetGoOfMomentsThatAreOver) {
     m_server->SetWindows({FakeWindow(1, 500, FRAME)});
     const std::weak_ptr<const WindowSnapshot> first = m_server->GetWindows();

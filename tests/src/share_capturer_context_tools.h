@@ -25,6 +25,7 @@ public:
     using ShareCapturerContext::_IsAppUnShared;
     using ShareCapturerContext::_IsWindowUnShared;
     using ShareCapturerContext::_UpdateAppsDisplay;
+    using ShareCapturerContext::AppDisplayRule;
     using ShareCapturerContext::ParamSet;
 
     using ShareCapturerContext::m_bFilterSelf;

@@ -6,8 +6,11 @@
 
 #include <gtest/gtest.h>
 
+#include <algorithm>
+#include <iterator>
 #include <map>
 #include <ostream>
+#include <random>
 #include <string>
 #include <vector>
 
@@ -50,7 +53,7 @@ protected:
         context.m_paramSet.reset();
         for (const TVLRect& window : windows)
             context.m_paramSet.rgnApplications.AddRect(window);
-        context._UpdateAppsDisplay(context.m_paramSet);
+        context._UpdateAppsDisplay(context.m_paramSet, CContextProbe::AppDisplayRule::InForce());
         return context.m_paramSet.vAppDisplays;
     }
     Values DisplaysByArea(const Rects& windows) {
@@ -147,6 +150,51 @@ TEST_F(ShareCapturerContextWalk, TakesAWindowWithoutAnOwnerForOneOfTheProcessTha
     EXPECT_FALSE(context.IsWindowShared(NOBODYS_WINDOW)) << "not one of process 0";
     context.m_vSharedApps = {SHARE_INVALID_PROCESS};
     EXPECT_TRUE(context.IsWindowShared(NOBODYS_WINDOW));
+}
+
+TEST_F(ShareCapturerContextWalk, JudgesAListOfWindowsAsItJudgesEachOfThem) {
+    constexpr unsigned SECOND = OWNER + 1;
+    desktop->SetWindows(
+        {FakeWindow(WINDOW, OWNER, {{10, 10}, {50, 50}}), FakeWindow(NOBODYS_WINDOW, 0, {{10, 10}, {50, 50}}),
+         FakeWindow(21, SECOND, {{10, 10}, {50, 50}}), FakeWindow(22, OWNER, {{0, 0}, {5, 5}})});
+    const std::vector<int> all{22, UNKNOWN_WINDOW, 21, WINDOW, NOBODYS_WINDOW};
+    const Values windows{WINDOW, NOBODYS_WINDOW, UNKNOWN_WINDOW, 21, 22};
+    const Values owners{OWNER, SECOND, SHARE_INVALID_PROCESS, 0};
+    std::mt19937 random(1);
+    int kept = 0;
+    for (int i = 0; i < 2000; ++i) {
+        CContextProbe judge;
+        const auto some = [&random](const Values& values) {
+            Values chosen;
+            std::copy_if(values.begin(), values.end(), std::back_inserter(chosen),
+                         [&](unsigned) { return random() % 4 == 0; });
+            return chosen;
+        };
+        judge.m_vSharedWindows = some(windows);
+        judge.m_vUnSharedWindows = some(windows);
+        judge.m_vSharedApps = some(owners);
+        judge.m_vUnSharedApps = some(owners);
+        judge.systemProcess = random() % 4 == 0 ? SECOND : OWNER + 9;
+        judge.SetShareType(random() % 2 == 0 ? SHARE_TYPE_DESKTOP : SHARE_TYPE_APP);
+        desktop->SetLife(random() % 8 == 0 ? platform::Life::Lost : platform::Life::Alive);
+        std::vector<int> expected;
+        std::copy_if(all.begin(), all.end(), std::back_inserter(expected), [&](int id) {
+            const auto window = static_cast<unsigned>(id);
+            return judge.IsWindowShared(window) && !judge.MayBeKeptOut(window);
+        });
+        std::vector<int> left = all;
+        judge.KeepShared(left);
+        ASSERT_EQ(left, expected) << i;
+        kept += static_cast<int>(left.size());
+    }
+    EXPECT_GT(kept, 1000);
+}
+
+TEST_F(ShareCapturerContextWalk, AsksOnceForTheOwnersOfAListOfWindows) {
+    std::vector<int> windows{WINDOW, NOBODYS_WINDOW, UNKNOWN_WINDOW};
+    context.KeepShared(windows);
+    EXPECT_EQ(windows, (std::vector<int>{WINDOW, NOBODYS_WINDOW})) << "whose the last one is can't be told";
+    EXPECT_EQ(desktop->calls.windows, 1);
 }
 
 TEST_F(ShareCapturerContextWalk, LooksForTheOwnerOnlyWhenTheWindowsListsLeaveItOpen) {
@@ -300,7 +348,7 @@ TEST_F(ShareCapturerContextWalk, TakesTheSharedDisplaysInADesktopShare) {
     context.m_mapAppDisplayRects = {{6, {}}};
     context.m_nTopAppWindow = WINDOW;
     context.m_paramSet.vAppDisplays = {9};
-    context._UpdateAppsDisplay(context.m_paramSet);
+    context._UpdateAppsDisplay(context.m_paramSet, CContextProbe::AppDisplayRule::InForce());
     EXPECT_EQ(context.m_paramSet.vAppDisplays, (Values{RIGHT, 5}));
     EXPECT_EQ(context.m_mapAppDisplayRects, (DisplayRects{{5, {1, 2, 3, 4}}}));
     EXPECT_EQ(desktop->calls.displays, 0);
@@ -321,7 +369,7 @@ TEST_F(ShareCapturerContextWalk, LeavesEverythingAsItIsWithoutADisplay) {
     context.SetShareType(SHARE_TYPE_APP);
     context.m_mapAppDisplayRects = {{6, {}}};
     context.m_paramSet.vAppDisplays = {9};
-    context._UpdateAppsDisplay(context.m_paramSet);
+    context._UpdateAppsDisplay(context.m_paramSet, CContextProbe::AppDisplayRule::InForce());
     EXPECT_EQ(context.m_paramSet.vAppDisplays, Values{9});
     EXPECT_EQ(context.m_mapAppDisplayRects, (DisplayRects{{6, {}}}));
 }

@@ -17,6 +17,7 @@ public:
         isMemoryGone = true;
         m_rgnDisplay.CopyRgn(empty);
         isMemoryGone = false;
+        _NoteChange();
     }
 };
 

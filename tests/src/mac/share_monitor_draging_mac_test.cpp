@@ -25,7 +25,11 @@ const std::string ENDED = Info("ShareUtilMacMonitorDraging::IsDraging status cha
 
 class CVisibleRegionContext final : public ShareCapturerContext {
 public:
-    void Show(const Rects& rects) { m_rgnVisible.CopyRgn(Region(rects)); }
+    void Show(const Rects& rects) {
+        ParamSet found;
+        found.rgnVisible.CopyRgn(Region(rects));
+        _CommitParamSet(found);
+    }
 };
 
 class MonitorDraging : public testing::Test {
