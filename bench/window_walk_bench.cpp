@@ -1,5 +1,6 @@
 // SPDX-License-Identifier: Apache-2.0
 #include "platform/simulated/scene.h"
+#include "src/app_share_config.h"
 #include "src/mac/share_capturer_context_mac.h"
 #include "util/cm_trace.h"
 
@@ -10,8 +11,8 @@
 #include <memory>
 #include <random>
 
-/// What a walk over a simulated desktop costs, by the number of windows, silent and with every line traced.
-/// The goal for 200 windows is 1 millisecond.
+/// What a walk over a simulated desktop costs, by the number of windows: one that is made, silent and with
+/// every line traced, and one that stands. The goal for 200 windows is 1 millisecond.
 
 namespace {
 
@@ -52,7 +53,12 @@ std::shared_ptr<platform::SimulatedWindowServer> ServeWindows(int count, const W
     return scene.Serve();
 }
 
-void Walk(benchmark::State& state, SHARE_TYPE shareType, const WindowSizes& sizes) {
+enum class Desktop {
+    AtRest,
+    Changing, ///< Something is another before each walk.
+};
+
+void WalkOver(benchmark::State& state, SHARE_TYPE shareType, const WindowSizes& sizes, Desktop desktop) {
     const auto former = platform::ReplaceWindowServer(ServeWindows(static_cast<int>(state.range(0)), sizes));
     {
         ShareCapturerContextMac context;
@@ -61,10 +67,22 @@ void Walk(benchmark::State& state, SHARE_TYPE shareType, const WindowSizes& size
         context.AddSharedApp(SHARED_APP);
         context.AddUnSharedApp(OTHER_APP);
         context.SetShareType(shareType);
-        for ([[maybe_unused]] const auto turn : state)
+        auto& rule = AppShareConfig::Instance()->m_bAppDisplayByWindow;
+        for ([[maybe_unused]] const auto turn : state) {
+            if (desktop == Desktop::Changing)
+                rule = !rule;
             benchmark::DoNotOptimize(context.UpdateShareCapturerContext());
+        }
     }
     platform::ReplaceWindowServer(former);
+}
+
+void Walk(benchmark::State& state, SHARE_TYPE shareType, const WindowSizes& sizes) {
+    WalkOver(state, shareType, sizes, Desktop::Changing);
+}
+
+void WalkAtRest(benchmark::State& state, SHARE_TYPE shareType) {
+    WalkOver(state, shareType, WINDOWS, Desktop::AtRest);
 }
 
 void WalkTraced(benchmark::State& state, SHARE_TYPE shareType, const WindowSizes& sizes) {
@@ -84,6 +102,8 @@ void WindowCounts(benchmark::internal::Benchmark* bench) {
 BENCHMARK_CAPTURE(Walk, application, SHARE_TYPE_APP, WINDOWS)->Apply(WindowCounts);
 BENCHMARK_CAPTURE(Walk, desktop, SHARE_TYPE_DESKTOP, WINDOWS)->Apply(WindowCounts);
 BENCHMARK_CAPTURE(Walk, application_small_windows, SHARE_TYPE_APP, SMALL_WINDOWS)->Apply(WindowCounts);
+BENCHMARK_CAPTURE(WalkAtRest, application, SHARE_TYPE_APP)->Apply(WindowCounts);
+BENCHMARK_CAPTURE(WalkAtRest, desktop, SHARE_TYPE_DESKTOP)->Apply(WindowCounts);
 BENCHMARK_CAPTURE(WalkTraced, application, SHARE_TYPE_APP, WINDOWS)->Apply(WindowCounts);
 
 } // namespace

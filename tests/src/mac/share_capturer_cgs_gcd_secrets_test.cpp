@@ -145,6 +145,7 @@ TEST_F(QueuedSecrets, AreNotShownWhenTheyAreWithdrawnInTheMiddleOfAWalk) {
     }
     ASSERT_TRUE(Settles());
     CClog clog;
+    desktop->SetTitle(EDITOR_WINDOW, "so that there is a walk");
     // The last look-up of a walk comes when its verdicts on windows are made.
     desktop->DoAt(Operation::GetLife, lookUps,
                   [this] { context->RemoveSharedApp(static_cast<unsigned>(NOTES)); });
