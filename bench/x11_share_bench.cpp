@@ -1,8 +1,7 @@
 // SPDX-License-Identifier: Apache-2.0
-#include "bench/meter/cpu_meter.h"
+#include "bench/meter/bare_loop.h"
 #include "bench/meter/scenes.h"
-#include "bench/meter/shared_picture.h"
-#include "bench/meter/statistics.h"
+#include "bench/meter/share_cost.h"
 #include "bench/meter/x11_bench.h"
 #include "platform/window_server.h"
 #include "platform/x11/x11_window_server.h"
@@ -11,12 +10,10 @@
 
 #include <unistd.h>
 
-#include <algorithm>
 #include <atomic>
 #include <chrono>
 #include <cstdio>
 #include <cstdlib>
-#include <map>
 #include <memory>
 #include <stdexcept>
 #include <string>
@@ -31,10 +28,7 @@
 namespace {
 
 using Clock = std::chrono::steady_clock;
-using Seconds = std::chrono::duration<double>;
-using Milliseconds = std::chrono::duration<double, std::milli>;
 
-constexpr unsigned FRAMES_PER_SECOND = 30;
 /// What first frames cost is not looked at.
 constexpr int FRAMES_BEFORE = 10;
 constexpr std::chrono::seconds START_LIMIT{20};
@@ -87,7 +81,7 @@ public:
     DesktopShare(const std::string& display, SCREEN_CAPTURER_TYPE mode)
         : m_server(display),
           m_engine(CreateShareCaptureEngine(SHARE_CAPTURE_ENGINE_TYPE_DESKTOP)) {
-        m_engine->SetCaptureFps(FRAMES_PER_SECOND);
+        m_engine->SetCaptureFps(TICKS_PER_SECOND);
         if (m_engine->SetCaptureMode(mode) != SHARE_RESULT_OK || !ShareFirstMonitor() ||
             m_engine->SetSink(&m_sink) != SHARE_RESULT_OK || m_engine->Start() != SHARE_RESULT_OK)
             throw std::runtime_error("the share doesn't start");
@@ -115,39 +109,15 @@ private:
     const std::unique_ptr<IShareCaptureEngine, DestroyEngine> m_engine;
 };
 
-// ---- The bare loop
+// ---- Who looks
 
-class BareLoop final : public Watcher {
+class BareWatcher final : public Watcher {
 public:
-    explicit BareLoop(const std::string& display)
-        : m_link(display),
-          m_picture(m_link.Get(), m_link.Screen().width_in_pixels, m_link.Screen().height_in_pixels),
-          m_thread([this] { Run(); }) {}
-    ~BareLoop() override {
-        m_ended = true;
-        m_thread.join();
-    }
-    BareLoop(const BareLoop&) = delete;
-    BareLoop& operator=(const BareLoop&) = delete;
-
-    int FrameCount() const override { return m_frames; }
+    explicit BareWatcher(const std::string& display) : m_loop(display) {}
+    int FrameCount() const override { return m_loop.FrameCount(); }
 
 private:
-    void Run() {
-        const auto period = std::chrono::nanoseconds(std::chrono::seconds(1)) / FRAMES_PER_SECOND;
-        Clock::time_point next = Clock::now();
-        while (!m_ended && m_picture.Fetch(m_link.Root())) {
-            ++m_frames;
-            next = std::max(next + period, Clock::now());
-            std::this_thread::sleep_until(next);
-        }
-    }
-
-    const XLink m_link;
-    const SharedPicture m_picture;
-    std::atomic<bool> m_ended{false};
-    std::atomic<int> m_frames{0};
-    std::thread m_thread; // last: it uses all the others
+    const BareLoop m_loop;
 };
 
 class SessionShare final : public Watcher {
@@ -176,14 +146,6 @@ public:
 
 // ---- Measuring
 
-/// CPU milliseconds a tick.
-struct Cost {
-    double client = 0;
-    double server = 0;
-    double framesPerSecond = 0;
-    std::map<std::string, double> clientByThread;
-};
-
 void WaitForFrames(const Watcher& watcher, int count) {
     const Clock::time_point limit = Clock::now() + START_LIMIT;
     while (watcher.FrameCount() < count) {
@@ -194,44 +156,8 @@ void WaitForFrames(const Watcher& watcher, int count) {
 }
 
 Cost Measure(const Watcher& watcher, pid_t server, double seconds) {
-    const Clock::time_point start = Clock::now();
-    const int framesBefore = watcher.FrameCount();
-    const TaskTimes clientBefore = ReadTaskTimes(getpid());
-    const TaskTimes serverBefore = ReadTaskTimes(server);
-    std::this_thread::sleep_for(Seconds(seconds));
-    const SpentTime client = SpentBetween(clientBefore, ReadTaskTimes(getpid()));
-    const SpentTime served = SpentBetween(serverBefore, ReadTaskTimes(server));
-    const double elapsed = Seconds(Clock::now() - start).count();
-    const int frames = watcher.FrameCount() - framesBefore;
-    if (client.endedTasks + served.endedTasks > 0)
-        std::printf("a thread has ended meanwhile: what it spent is missing in the next line\n");
-    const double ticks = elapsed * FRAMES_PER_SECOND;
-    Cost cost{Milliseconds(client.total).count() / ticks,
-              Milliseconds(served.total).count() / ticks,
-              frames / elapsed,
-              {}};
-    for (const auto& [thread, time] : client.byTask)
-        cost.clientByThread[thread] = Milliseconds(time).count() / ticks;
-    return cost;
+    return MeasureCost({getpid(), [&watcher] { return watcher.FrameCount(); }}, server, seconds);
 }
-
-struct Costs {
-    std::vector<double> client;
-    std::vector<double> server; ///< Without the scene's own.
-    std::vector<double> total;
-    std::vector<double> framesPerSecond;
-    std::map<std::string, std::vector<double>> clientByThread;
-
-    void Add(const Cost& cost, double sceneAlone) {
-        const double net = cost.server - sceneAlone;
-        client.push_back(cost.client);
-        server.push_back(net);
-        total.push_back(cost.client + net);
-        framesPerSecond.push_back(cost.framesPerSecond);
-        for (const auto& [thread, time] : cost.clientByThread)
-            clientByThread[thread].push_back(time);
-    }
-};
 
 class SceneBench {
 public:
@@ -247,7 +173,7 @@ public:
             alone.push_back(Measure(Nobody(), m_server.Pid(), m_options.seconds).server);
             share.Add(MeasureOne<DefaultShare>(), alone.back());
             session.Add(MeasureOne<SessionShare>(), alone.back());
-            bare.Add(MeasureOne<BareLoop>(), alone.back());
+            bare.Add(MeasureOne<BareWatcher>(), alone.back());
         }
         if (!playing.IsPlaying())
             throw std::runtime_error("the scene has ended before its time");

@@ -15,11 +15,14 @@ struct Scene {
     int width = 0; ///< Of what changes; it lies in a window that fills the desktop.
     int height = 0;
     int framesPerSecond = 0;
-    int windows = 0; ///< In place of all that: so many small windows with titles, which stand still.
+    int windows = 0;      ///< In place of all that: so many small windows with titles, which stand still.
+    bool covered = false; ///< By another window, of the same size and opaque; and kept whole in a storage.
 };
 
 /// static; typing, 300x20 at 10 Hz; video, 1280x720 at 30 Hz; full motion, 1920x1080 at 30 Hz.
 const std::vector<Scene>& MovingScenes();
+/// That part of a desktop of that size changes at 30 Hz.
+Scene SceneOfChange(double part, int desktopWidth, int desktopHeight);
 Scene SceneOfWindows(int count);
 
 /// A scene on a display, from when it is painted for the first time to the end of this object. Throws
@@ -32,8 +35,11 @@ public:
 
     /// False when it has ended, so that nothing has moved any more.
     bool IsPlaying() { return m_process->IsRunning(); }
+    /// The window that the scene is painted in; of several windows, the hindmost.
+    unsigned Window() const { return m_window; }
 
 private:
+    unsigned m_window = 0;
     std::unique_ptr<CChildProcess> m_process;
 };
 

@@ -62,12 +62,15 @@ bool SharedPicture::Fetch(xcb_drawable_t drawable) const {
     return fetched;
 }
 
-void PaintSquares(const SharedPicture& picture, std::uint32_t seed) {
+std::uint32_t ColourOfSquares(int x, int y, std::uint32_t seed) {
     constexpr int SIDE = 8;
+    return ColourOf(static_cast<std::uint32_t>(x / SIDE), static_cast<std::uint32_t>(y / SIDE), seed);
+}
+
+void PaintSquares(const SharedPicture& picture, std::uint32_t seed) {
     std::uint32_t* pixel = picture.Pixels();
     for (int y = 0; y < picture.Height(); ++y) {
         for (int x = 0; x < picture.Width(); ++x)
-            *pixel++ =
-                ColourOf(static_cast<std::uint32_t>(x / SIDE), static_cast<std::uint32_t>(y / SIDE), seed);
+            *pixel++ = ColourOfSquares(x, y, seed);
     }
 }

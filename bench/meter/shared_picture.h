@@ -37,3 +37,5 @@ private:
 
 /// Squares of colours that look random, others for each seed: no two pictures have a square in common.
 void PaintSquares(const SharedPicture& picture, std::uint32_t seed);
+/// What PaintSquares paints at a place: 0xRRGGBB.
+std::uint32_t ColourOfSquares(int x, int y, std::uint32_t seed);

@@ -1,0 +1,44 @@
+// SPDX-License-Identifier: Apache-2.0
+#include "bench/compare/compare_peers.h"
+#include "bench/compare/compare_rows.h"
+#include "bench/meter/scenes.h"
+#include "bench/meter/x11_bench.h"
+
+#include <cstdio>
+#include <cstdlib>
+#include <exception>
+#include <memory>
+
+/// What this library costs beside what a user would pick instead: shares of a screen of 1920x1080 and of one
+/// covered window, thirty frames a second with the pointer in them, by scene; then what grows with what.
+
+namespace {
+
+void RunOn(XServerOptions::Kind kind, const BenchOptions& options, BenchResults& results) {
+    const std::unique_ptr<XServer> server = StartBenchServer(kind);
+    if (server == nullptr)
+        return;
+    Comparison comparison(*server, options, FindPeers(), results);
+    comparison.RunShares();
+    comparison.RunChanges();
+    comparison.RunWindows();
+    comparison.RunCaptures();
+    comparison.RunLists();
+}
+
+} // namespace
+
+int main(int argc, char** argv) {
+    if (const auto played = PlaySceneIfAsked(argc, argv))
+        return *played;
+    try {
+        const BenchOptions options = ReadBenchOptions(argc, argv);
+        BenchResults results;
+        for (const auto kind : options.servers)
+            RunOn(kind, options, results);
+        return options.out.empty() || results.Write(options.out) ? EXIT_SUCCESS : EXIT_FAILURE;
+    } catch (const std::exception& failure) {
+        std::fprintf(stderr, "compare_bench: %s\n", failure.what());
+        return EXIT_FAILURE;
+    }
+}

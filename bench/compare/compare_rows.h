@@ -1,0 +1,54 @@
+// SPDX-License-Identifier: Apache-2.0
+#pragma once
+
+#include "bench/compare/compare_peers.h"
+#include "bench/compare/compare_table.h"
+#include "bench/meter/scenes.h"
+#include "bench/meter/x11_bench.h"
+
+#include <optional>
+#include <string>
+#include <vector>
+
+/// Measures peers side by side on one X server and tells what was found. In each repeat the scene alone and
+/// the peers take turns, so that all of them meet the same machine.
+/// Errors: std::runtime_error when a peer fails or shows something else than the scene.
+class Comparison {
+public:
+    Comparison(const XServer& server, const BenchOptions& options, std::vector<Peer> peers,
+               BenchResults& results);
+
+    /// Shares of the screen, and of one window that another one covers.
+    void RunShares();
+    /// Cost against the part of the screen that changes.
+    void RunChanges();
+    /// Cost against the number of windows that stand still.
+    void RunWindows();
+    /// Several captures of one screen in a process.
+    void RunCaptures();
+    /// The time to list the windows.
+    void RunLists();
+
+private:
+    struct Plan {
+        std::string row;
+        Scene scene;
+        Subject subject;
+        std::vector<Peer> peers;
+        std::optional<double> goal;
+    };
+
+    void Run(Plan plan);
+    void MeasureOne(const Plan& plan, PeerCosts& peer, double sceneAlone);
+    void Verify(RunningPeer& peer, const Scene& scene) const;
+    /// Ours and those configurations of WebRTC's that don't compare frames, which have never been the best.
+    std::vector<Peer> Rivals() const;
+    void List(const Peer& peer, const std::string& row, int windows);
+    void TellHeaderOnce();
+
+    const XServer& m_server;
+    const BenchOptions m_options;
+    const std::vector<Peer> m_peers;
+    BenchResults& m_results;
+    bool m_headerTold = false;
+};
