@@ -11,11 +11,14 @@
 #include <cstdio>
 #include <iterator>
 #include <stdexcept>
+#include <thread>
 #include <utility>
 
 namespace {
 
 const std::string PREFIX = "compare/";
+/// What the server and the scene do after a peer has gone is over then.
+constexpr std::chrono::milliseconds CLEARING{700};
 
 struct Goal {
     const char* scene;
@@ -39,6 +42,16 @@ std::string WithDigits(double part) {
     std::array<char, 16> text{};
     std::snprintf(text.data(), text.size(), "%.4f", part);
     return text.data();
+}
+
+/// How many of the ticks had a frame. Of those that tell their frames only now and then, it is too rough to
+/// be used.
+double ShareOfTicks(const Peer& peer, const Cost& cost) {
+    if (peer.talk != Peer::Talk::Answers)
+        return 1;
+    if (!(cost.framesPerSecond > 0))
+        throw std::runtime_error(peer.name + " delivers no frames any more");
+    return cost.framesPerSecond / TICKS_PER_SECOND;
 }
 
 template <class Predicate>
@@ -107,24 +120,32 @@ void Comparison::Run(Plan plan) {
         plan.subject.window = playing.Window();
     for (const Peer& peer : plan.peers)
         row.peers.push_back({peer, {}, 0});
+    std::vector<std::vector<Cost>> measured(row.peers.size());
     for (int i = 0; i < m_options.repeats; ++i) {
+        std::this_thread::sleep_for(CLEARING);
         row.sceneAlone.push_back(MeasureCost({}, m_server.Pid(), m_options.seconds).server);
-        for (PeerCosts& peer : row.peers)
-            MeasureOne(plan, peer, row.sceneAlone.back());
+        for (std::size_t peer = 0; peer < row.peers.size(); ++peer)
+            measured[peer].push_back(MeasureOne(plan, row.peers[peer]));
     }
     if (!playing.IsPlaying())
         throw std::runtime_error("the scene has ended before its time");
+    const double alone = SpreadOf(row.sceneAlone).median;
+    for (std::size_t peer = 0; peer < row.peers.size(); ++peer) {
+        for (const Cost& cost : measured[peer])
+            row.peers[peer].costs.Add(cost, alone, ShareOfTicks(row.peers[peer].peer, cost));
+    }
     TellRow(row, m_results);
 }
 
-void Comparison::MeasureOne(const Plan& plan, PeerCosts& peer, double sceneAlone) {
+Cost Comparison::MeasureOne(const Plan& plan, PeerCosts& peer) const {
     RunningPeer running(peer.peer, m_server.Display(), plan.subject);
     if (running.TellsPixels())
         Verify(running, plan.scene);
     const auto frames = running.CountsFrames() ? std::function<int()>([&running] { return running.Frames(); })
                                                : std::function<int()>();
-    peer.costs.Add(MeasureCost({running.Pid(), frames}, m_server.Pid(), m_options.seconds), sceneAlone);
+    const Cost cost = MeasureCost({running.Pid(), frames}, m_server.Pid(), m_options.seconds);
     peer.peakMegabytes = std::max(peer.peakMegabytes, running.PeakMegabytes());
+    return cost;
 }
 
 /// Near the corner, where only a scene that moves everywhere changes anything.

@@ -39,7 +39,7 @@ private:
     };
 
     void Run(Plan plan);
-    void MeasureOne(const Plan& plan, PeerCosts& peer, double sceneAlone);
+    Cost MeasureOne(const Plan& plan, PeerCosts& peer) const;
     void Verify(RunningPeer& peer, const Scene& scene) const;
     /// Ours and those configurations of WebRTC's that don't compare frames, which have never been the best.
     std::vector<Peer> Rivals() const;

@@ -25,8 +25,7 @@ struct ComparedRow {
     std::optional<double> goal; ///< Of our ratio.
 };
 
-/// The configuration of WebRTC's capturer with the lowest median total, of those that deliver nine frames of
-/// ten; null without one.
+/// The configuration of WebRTC's capturer with the lowest median total; null without one.
 const PeerCosts* BestWebrtc(const ComparedRow& row);
 /// Of a peer's total to another's, repeat by repeat; the median is that of the medians. Both have been
 /// repeated as often.

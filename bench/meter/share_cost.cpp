@@ -41,12 +41,12 @@ Cost MeasureCost(const Onlooker& onlooker, pid_t server, double seconds) {
     return cost;
 }
 
-void Costs::Add(const Cost& cost, double sceneAlone) {
+void Costs::Add(const Cost& cost, double sceneAlone, double share) {
     const double net = cost.server - sceneAlone;
-    client.push_back(cost.client);
-    server.push_back(net);
-    total.push_back(cost.client + net);
+    client.push_back(cost.client / share);
+    server.push_back(net / share);
+    total.push_back((cost.client + net) / share);
     framesPerSecond.push_back(cost.framesPerSecond);
     for (const auto& [thread, time] : cost.clientByThread)
-        clientByThread[thread].push_back(time);
+        clientByThread[thread].push_back(time / share);
 }

@@ -40,6 +40,7 @@ struct Costs {
     std::vector<double> framesPerSecond;
     std::map<std::string, std::vector<double>> clientByThread;
 
-    /// `sceneAlone` is what the server spends on the scene when nobody looks.
-    void Add(const Cost& cost, double sceneAlone);
+    /// `sceneAlone` is what the server spends on the scene when nobody looks. `share` of the ticks had a
+    /// frame: what was spent is divided by that, or missing frames would look like savings.
+    void Add(const Cost& cost, double sceneAlone, double share = 1);
 };
