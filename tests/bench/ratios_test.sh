@@ -1,8 +1,8 @@
 #!/bin/bash
 # SPDX-License-Identifier: Apache-2.0
 #
-# The comparison's ratios are judged by what is stored, and its results can be drawn and published. Called with the name
-# of a case. Needs no server: the results are made up.
+# The comparison's ratios are judged by what is stored, and its results can be drawn and published. Called with a
+# program that it does not need and the name of a case. No server runs: the results are made up.
 set -uo pipefail
 root=$(dirname "$(readlink -f "${BASH_SOURCE[0]}")")/../..
 folder=$(mktemp -d) || exit 1
@@ -71,4 +71,4 @@ case_results_are_drawn_and_published() {
     [[ $(head -n 1 "$page") == before && $(tail -n 1 "$page") == after ]] || fail "the rest of the page has changed"
 }
 
-"case_$1"
+"case_${*: -1}"
