@@ -211,7 +211,8 @@ void Comparison::List(const Peer& peer, const std::string& row, int windows) {
                                           {"wall_us_highest", waited.highest},
                                           {"cpu_us", spent.median},
                                           {"cpu_us_lowest", spent.lowest},
-                                          {"cpu_us_highest", spent.highest}});
+                                          {"cpu_us_highest", spent.highest},
+                                          {"repeats", m_options.repeats}});
 }
 
 void Comparison::TellHeaderOnce() {

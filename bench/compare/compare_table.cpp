@@ -28,7 +28,8 @@ void TellPeer(const ComparedRow& row, const PeerCosts& peer, const PeerCosts* be
                                 {"total_ms_lowest", total.lowest},
                                 {"total_ms_highest", total.highest},
                                 {"frames_per_second", rate},
-                                {"peak_megabytes", peer.peakMegabytes}};
+                                {"peak_megabytes", peer.peakMegabytes},
+                                {"repeats", static_cast<double>(peer.costs.total.size())}};
     std::printf("  %-22s %8.3f %8.3f %8.3f [%7.3f ..%7.3f] %5.1f %7.1f", peer.peer.name.c_str(), client,
                 server, total.median, total.lowest, total.highest, rate, peer.peakMegabytes);
     if (best != nullptr) {

@@ -20,8 +20,8 @@ def load(path):
 
 
 def best_webrtc(peers):
-    """The name of WebRTC's cheapest configuration in a row; None without one."""
-    names = [name for name in peers if name.split()[0] == WEBRTC]
+    """The name of WebRTC's cheapest configuration in a row of shares; None without one."""
+    names = [name for name, entry in peers.items() if name.split()[0] == WEBRTC and "total_ms" in entry]
     return min(names, key=lambda name: peers[name]["total_ms"], default=None)
 
 

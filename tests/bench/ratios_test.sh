@@ -19,9 +19,10 @@ results() { # FILE LOWEST MEDIAN HIGHEST
     cat >"$1" <<END
 {"benchmarks": [
 {"name": "compare/screen/static/screenshare", "client_ms": $3, "server_ms": 0, "total_ms": $3, "total_ms_lowest": $2,
- "total_ms_highest": $4, "peak_megabytes": 30, "ratio": $3, "ratio_lowest": $2, "ratio_highest": $4, "goal": 0.5},
+ "total_ms_highest": $4, "peak_megabytes": 30, "repeats": 4, "ratio": $3, "ratio_lowest": $2, "ratio_highest": $4, "goal": 0.5},
+{"name": "compare/list/50/screenshare", "wall_us": 2, "repeats": 5}, {"name": "compare/list/50/webrtc", "wall_us": 30, "repeats": 5},
 {"name": "compare/screen/static/webrtc", "client_ms": 1, "server_ms": 0, "total_ms": 1, "total_ms_lowest": 0.9,
- "total_ms_highest": 1.1, "peak_megabytes": 31}]}
+ "total_ms_highest": 1.1, "peak_megabytes": 31, "repeats": 5}]}
 END
 }
 
@@ -67,7 +68,11 @@ case_results_are_drawn_and_published() {
     printf 'before\n<!-- compare scenes -->\nold\n<!-- end -->\nafter\n' >"$page"
     "$root/bench/compare/publish" "$folder/now.json" "$page" || fail "not published"
     grep -q '| 0.51 (0.45 .. 0.60) |' "$page" || fail "the table lacks the cost"
+    grep -q 'Repeats of each: 4, too few' "$page" || fail "the table doesn't tell how few repeats there were"
     grep -q '^old$' "$page" && fail "the old table is still there"
+    printf '<!-- compare more -->\n<!-- end -->\n' >"$folder/more.md"
+    "$root/bench/compare/publish" "$folder/now.json" "$folder/more.md" || fail "not published"
+    grep -q '| 0.0020 | 0.0300 |' "$folder/more.md" || fail "the table lacks the list"
     [[ $(head -n 1 "$page") == before && $(tail -n 1 "$page") == after ]] || fail "the rest of the page has changed"
 }
 
