@@ -55,14 +55,17 @@ Seen CaptureThroughUnrest(MakeCapturer make, const SimulatedLie* lie, int captur
     const auto capturer = make(std::make_shared<ShareCapturerContextMac>());
 
     std::atomic<bool> isOver{false};
+    std::atomic<int> steps{0};
     std::thread other([&] {
         CUnrest unrest(*desktop.operator->(), SEED);
-        while (!isOver)
+        for (; !isOver; ++steps)
             unrest.Step();
     });
     Seen seen;
     const FrameRef frame = NewFrameRef();
     for (int i = 0; i < captures; ++i) {
+        while (steps < i) // captures are soon made, and threads are not soon started
+            std::this_thread::yield();
         clock->Advance(std::chrono::milliseconds(501)); // whatever has moved is at rest by now
         capturer->SetCaptureMaxSize(i % 7 == 0 ? TVLSize{77, 55} : TVLSize{1920, 1080});
         if (i % 50 == 0)
