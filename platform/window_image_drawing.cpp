@@ -130,22 +130,34 @@ bool WindowImageDrawing::AddChanges(const WindowImageDrawing& earlier, const CGW
         earlier.m_layers.size() != m_layers.size() || earlier.m_clip != m_clip)
         return false;
     for (std::size_t i = 0; i < m_layers.size(); ++i) {
-        const Layer& layer = m_layers[i];
-        if (!layer.IsAtSamePlaceAs(earlier.m_layers[i]))
+        const std::uint64_t before = earlier.m_layers[i].serial;
+        if (!m_layers[i].IsAtSamePlaceAs(earlier.m_layers[i]))
             return false;
-        if (layer.serial == earlier.m_layers[i].serial)
-            continue;
-        const std::optional<PixelRegion> changed =
-            ChangesSince(*image->layers[i].picture, earlier.m_layers[i].serial);
-        if (!changed || layer.IsScaled())
+        if (m_layers[i].serial != before && !AddChangesOf(i, *image->layers[i].picture, before, changes))
             return false;
-        for (const PixelRect& rect : changed->Rects()) {
-            const std::int64_t x = layer.place.left;
-            const std::int64_t y = layer.place.top;
-            const PixelBox moved{x + rect.left, y + rect.top, x + rect.right, y + rect.bottom};
-            changes.Add(Seen(CommonBox(moved, layer.place)));
-        }
     }
+    return true;
+}
+
+/// Those that no window in front hides.
+bool WindowImageDrawing::AddChangesOf(std::size_t index, const Picture& picture, std::uint64_t earlier,
+                                      PixelRegion& changes) const {
+    const Layer& layer = m_layers[index];
+    const std::optional<PixelRegion> changed = ChangesSince(picture, earlier);
+    if (!changed || layer.IsScaled())
+        return false;
+    PixelRegion seen;
+    for (const PixelRect& rect : changed->Rects()) {
+        const std::int64_t x = layer.place.left;
+        const std::int64_t y = layer.place.top;
+        const PixelBox moved{x + rect.left, y + rect.top, x + rect.right, y + rect.bottom};
+        seen.Add(Seen(CommonBox(moved, layer.place)));
+    }
+    for (std::size_t i = index + 1; i < m_layers.size() && !seen.IsEmpty(); ++i) {
+        if (m_layers[i].IsOpaque())
+            seen.Subtract(Seen(m_layers[i].place));
+    }
+    changes.Add(seen);
     return true;
 }
 

@@ -8,6 +8,7 @@
 #include "platform/core_types.h"
 #include "platform/pixel_region.h"
 
+#include <cstddef>
 #include <cstdint>
 #include <vector>
 
@@ -52,11 +53,15 @@ private:
         PixelBox place;
         float alpha = 1.0F;
 
+        /// Leaves nothing of what is behind it. What is scaled may fail to be drawn, for want of memory.
+        bool IsOpaque() const { return alpha >= 1.0F && !CGHasAlpha(layout) && !IsScaled(); }
         bool IsScaled() const { return place.Width() != width || place.Height() != height; }
         bool IsAtSamePlaceAs(const Layer& other) const;
         bool operator==(const Layer&) const = default;
     };
 
+    bool AddChangesOf(std::size_t index, const Picture& picture, std::uint64_t earlier,
+                      PixelRegion& changes) const;
     PixelRect Seen(const PixelBox& box) const;
 
     PixelBox m_clip; // where it is seen, within the context

@@ -81,12 +81,10 @@ struct CShareCGSCapturer::Pass {
     platform::CGRect imageRect; // what the image shows
     platform::CGRect drawRect;  // what the frame shows
     bool isDesktop = true;
+    int background = BLACK; // read once: the note tells the colour that was painted
     platform::CGRect place; // where the image goes, counted from the bottom of the frame
     std::optional<ShareCursorDrawing> pointer;
 
-    int Background() const {
-        return isDesktop ? BLACK : int{AppShareConfig::Instance()->m_nAppShareBackgroundColor};
-    }
     /// Whether the image leaves nothing of what is where the context can be painted on now.
     bool CoversClip(const platform::CGContext* context) const {
         return platform::CGContextIsCovered(context, place, image.get());
@@ -108,7 +106,7 @@ public:
         m_size = pass.bitmap;
         m_background.reset();
         if (!pass.CoversClip(context))
-            m_background = pass.Background();
+            m_background = pass.background;
         m_pointer = {};
         if (pass.pointer)
             m_pointer = {pass.pointer->image, pass.pointer->rect,
@@ -237,7 +235,9 @@ int CShareCGSCapturer::capture(IShareFrame* frame, unsigned display, TVLSize bit
     }
     m_rectCapturedDisplay = platform::CGDisplayBounds(display);
 
-    Pass pass{bitmap, capture, nullptr, {}, m_rectCapturedDisplay, isDesktopSharing(), {}, {}};
+    Pass pass{bitmap, capture, nullptr, {}, m_rectCapturedDisplay, isDesktopSharing(), BLACK, {}, {}};
+    if (!pass.isDesktop)
+        pass.background = AppShareConfig::Instance()->m_nAppShareBackgroundColor;
     const int result = createShareImage(m_rectCapturedDisplay, pass.image, pass.imageRect);
     if (result == SHARE_CAPTURE_NO_DATA)
         pass.imageRect = m_rectLastCapture.size.width != 0 ? m_rectLastCapture : m_rectCapturedDisplay;
@@ -386,7 +386,7 @@ bool CShareCGSCapturer::DrawAll(const Pass& pass) {
     const bool isWhole = platform::CGContextDrawWindowImage(m_bmpContext.get(), pass.place, pass.image.get());
     // Where a layer is missing, the frame may still show an earlier picture.
     if (!isWhole && pass.CoversClip(m_bmpContext.get()))
-        FillWhole(m_bmpContext.get(), pass.bitmap, pass.Background());
+        FillWhole(m_bmpContext.get(), pass.bitmap, pass.background);
     DrawPointer(pass);
     return isWhole;
 }
@@ -395,7 +395,7 @@ bool CShareCGSCapturer::DrawAll(const Pass& pass) {
 /// windows that may be kept out by now.
 void CShareCGSCapturer::PaintBackground(const Pass& pass) {
     if (!pass.CoversClip(m_bmpContext.get()))
-        FillWhole(m_bmpContext.get(), pass.bitmap, pass.Background());
+        FillWhole(m_bmpContext.get(), pass.bitmap, pass.background);
 }
 
 void CShareCGSCapturer::DrawPointer(const Pass& pass) {
