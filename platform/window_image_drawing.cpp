@@ -4,92 +4,10 @@
 #include "platform/picture_changes.h"
 #include "platform/window_image_layers.h"
 
-#include <cmath>
 #include <cstddef>
 #include <optional>
 
 namespace platform {
-
-namespace {
-
-struct Span {
-    double from = 0;
-    double to = 0;
-};
-
-/// Whole pixels, so that two windows which meet still meet when they are scaled; at least one.
-Span WholePixels(const Span& span) {
-    const Span whole{std::floor(span.from + 0.5), std::floor(span.to + 0.5)};
-    if (whole.from < whole.to)
-        return whole;
-    const double only = std::floor((span.from + span.to) / 2);
-    return {only, only + 1};
-}
-
-CGRect RectOf(const Span& across, const Span& upwards) {
-    return {{static_cast<CGFloat>(across.from), static_cast<CGFloat>(upwards.from)},
-            {static_cast<CGFloat>(across.to - across.from), static_cast<CGFloat>(upwards.to - upwards.from)}};
-}
-
-bool CoversClip(const CGContext* context, const CGRect& rect, const CGWindowImage& image,
-                const WindowLayer& layer) {
-    return layer.IsOpaque() &&
-           CGContextBoxOf(context, PlaceOfLayer(layer, image, rect)).Contains(CGContextGetClip(context));
-}
-
-/// The front layer that leaves nothing of what is behind it in the clip, with which drawing can begin; the
-/// one at the back without such.
-std::size_t FirstSeenLayer(const CGContext* context, const CGRect& rect, const CGWindowImage& image) {
-    for (std::size_t i = image.layers.size(); i > 1; --i) {
-        if (CoversClip(context, rect, image, image.layers[i - 1]))
-            return i - 1;
-    }
-    return 0;
-}
-
-} // namespace
-
-bool IsFiniteArea(const CGRect& rect) {
-    return std::isfinite(rect.origin.x) && std::isfinite(rect.origin.y) && std::isfinite(rect.size.width) &&
-           std::isfinite(rect.size.height) && rect.size.width > 0 && rect.size.height > 0;
-}
-
-CGRect PlaceOfLayer(const WindowLayer& layer, const CGWindowImage& image, const CGRect& target) {
-    const PointEdges& seen = image.edges;
-    const PointEdges& edges = layer.edges;
-    const double x = target.origin.x;
-    const double y = target.origin.y;
-    const double width = target.size.width;
-    const double height = target.size.height;
-    const Span across{x + (edges.left - seen.left) / seen.Width() * width,
-                      x + (edges.right - seen.left) / seen.Width() * width};
-    const Span upwards{y + (seen.bottom - edges.bottom) / seen.Height() * height,
-                       y + (seen.bottom - edges.top) / seen.Height() * height};
-    return RectOf(WholePixels(across), WholePixels(upwards));
-}
-
-bool CGContextIsCovered(const CGContext* context, const CGRect& rect, const CGWindowImage* image) noexcept {
-    if (context == nullptr || image == nullptr || image->layers.empty() || !IsFiniteArea(rect))
-        return false;
-    return CGContextBoxOf(context, rect).Contains(CGContextGetClip(context)) &&
-           CoversClip(context, rect, *image, image->layers[FirstSeenLayer(context, rect, *image)]);
-}
-
-bool CGContextDrawWindowImage(CGContext* context, const CGRect& rect, const CGWindowImage* image) noexcept {
-    if (context == nullptr || image == nullptr || !IsFiniteArea(rect))
-        return true;
-    const PixelBox clip = CGContextGetClip(context);
-    CGContextClipToRect(context, rect);
-    bool isWhole = true;
-    for (std::size_t i = FirstSeenLayer(context, rect, *image); i < image->layers.size(); ++i) {
-        const WindowLayer& layer = image->layers[i];
-        CGContextSetAlpha(context, layer.alpha);
-        isWhole &= CGContextDrawImage(context, PlaceOfLayer(layer, *image, rect), layer.image.get());
-    }
-    CGContextSetAlpha(context, 1);
-    CGContextSetClip(context, clip);
-    return isWhole;
-}
 
 bool WindowImageDrawing::Layer::IsAtSamePlaceAs(const Layer& other) const {
     return window == other.window && width == other.width && height == other.height &&
