@@ -3,11 +3,13 @@
 #include "platform/simulated/scene.h"
 #include "src/mac/cgs_composition.h"
 #include "src/mac/share_capturer_context_mac.h"
+#include "src/share_capture_engine_kinds.h"
 #include "src/share_frame.h"
 #include "src/share_ref.h"
 #include "tests/support/forwarding_window_server.h"
 
 #include <screenshare/share_capturer.h>
+#include <screenshare/share_engine.h>
 
 #include <benchmark/benchmark.h>
 
@@ -150,10 +152,58 @@ constexpr Case CASES[] = {
     {"from scratch", 0, {}, false},
 };
 
+class CIdleSink final : public IShareCaptureEngineSink {
+public:
+    void OnCaptureDisplaySizeChanged(TVLSize) override {}
+    void OnCapturedWindowListChanged(const unsigned*, int) override {}
+    void OnCaptureStatusChanged(int) override {}
+    void OnCaptureData(IShareFrame*, TVLRect&) override { ++frames; }
+    void OnCaptureError(int) override {}
+    void OnCapturePositionChanged(int, int, int, int) override {}
+    void OnCaptureEvent(int, int, void*) override {}
+
+    long frames = 0;
+};
+
+/// An engine whose passes run on the thread of the benchmark: it counts as started and has no worker.
+class CBenchedEngine final : public CShareCaptureDesktopEngine {
+public:
+    void BelieveStarted() { m_eSHARE_CAPTURE_ENGINE_STATUS = SHARE_CAPTURE_ENGINE_STATUS_STARTED; }
+};
+
+/// A whole pass of an engine: with the walk, the duplicate check if it is wanted, and the sink.
+void Pass(benchmark::State& state, bool checksDuplicates, const Case& each) {
+    const auto server = std::make_shared<CCannedPictures>(Desk().Serve());
+    const CWindowServerScope scope(server);
+    if (each.window != 0)
+        server->PaintEachTime(each.window, each.painted);
+    CIdleSink sink;
+    auto* const engine = new CBenchedEngine;
+    engine->SelectSharedDisplay(DISPLAY);
+    engine->Config(SHARE_CAPTURE_ENGINE_CONFIG_CHECK_DUP_FRAME, &checksDuplicates, sizeof checksDuplicates);
+    engine->SetSink(&sink);
+    engine->BelieveStarted();
+    for (int i = 0; i < 4; ++i)
+        CShareCaptureEngine::ThreadRun(engine);
+    const long before = g_allocations.load();
+    while (state.KeepRunning())
+        CShareCaptureEngine::ThreadRun(engine);
+    state.counters["allocations"] =
+        static_cast<double>(g_allocations.load() - before) / static_cast<double>(state.iterations());
+    if (sink.frames == 0)
+        state.SkipWithError("no frame");
+    engine->SetSink(nullptr);
+    DestroyShareCaptureEngine(engine);
+}
+
 const bool g_isRegistered = [] {
     for (const Case& each : CASES)
         benchmark::RegisterBenchmark((std::string("Compose/") + each.name).c_str(), Compose, each)
             ->Unit(benchmark::kMicrosecond);
+    benchmark::RegisterBenchmark("Pass/nothing", Pass, false, CASES[0])->Unit(benchmark::kMicrosecond);
+    benchmark::RegisterBenchmark("Pass/nothing, duplicates held back", Pass, true, CASES[0])
+        ->Unit(benchmark::kMicrosecond);
+    benchmark::RegisterBenchmark("Pass/typing", Pass, false, CASES[1])->Unit(benchmark::kMicrosecond);
     return true;
 }();
 
