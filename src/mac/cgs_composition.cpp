@@ -4,9 +4,9 @@
 #include "platform/bitmap_context_clip.h"
 #include "platform/core_graphics.h"
 #include "platform/pixel_region.h"
-#include "platform/window_image_drawing.h"
 #include "platform/window_services.h"
 #include "src/app_share_config.h"
+#include "src/mac/cgs_composition_note.h"
 #include "src/mac/monitor_enum_mac.h"
 #include "src/mac/share_util_mac.h"
 #include "src/share_capturer_context.h"
@@ -21,7 +21,6 @@
 #include <screenshare/share_graphic_util.h>
 
 #include <algorithm>
-#include <cstddef>
 #include <cstring>
 #include <new>
 #include <optional>
@@ -31,8 +30,6 @@ namespace {
 
 constexpr int BLACK = 0;
 constexpr int BYTES_PER_PIXEL = 4;
-/// Changes of more rectangles are drawn as the one around them.
-constexpr std::size_t MOST_CHANGED_RECTS = 64;
 
 bool HasArea(const platform::CGRect& rect) {
     return rect.size.width != 0 && rect.size.height != 0;
@@ -89,84 +86,6 @@ struct CShareCGSCapturer::Pass {
     bool CoversClip(const platform::CGContext* context) const {
         return platform::CGContextIsCovered(context, place, image.get());
     }
-};
-
-// ---- What a frame shows
-
-class CShareCGSCapturer::Note final : public ShareFrameNote {
-public:
-    bool IsSameAs(const ShareFrameNote& other) const override {
-        const auto* const note = dynamic_cast<const Note*>(&other);
-        return note != nullptr && IsSameGround(*note) && m_drawing == note->m_drawing &&
-               m_pointer == note->m_pointer;
-    }
-
-    /// False when it can't be told.
-    bool Describe(const Pass& pass, const platform::CGContext* context) {
-        m_size = pass.bitmap;
-        m_background.reset();
-        if (!pass.CoversClip(context))
-            m_background = pass.background;
-        m_pointer = {};
-        if (pass.pointer)
-            m_pointer = {pass.pointer->image, pass.pointer->rect,
-                         platform::CommonBox(platform::CGContextBoxOf(context, pass.pointer->rect),
-                                             platform::CGContextGetClip(context))};
-        m_drawing.Clear();
-        return context != nullptr &&
-               (pass.image == nullptr || m_drawing.Describe(context, pass.place, pass.image.get()));
-    }
-
-    /// The pixels that are different from an earlier picture, and can be drawn without the others. Nothing
-    /// when all have to be drawn.
-    std::optional<platform::PixelRegion> ChangesSince(const Note& before,
-                                                      const platform::CGWindowImage* image) const {
-        platform::PixelRegion changes;
-        if (!IsSameGround(before) || !m_drawing.AddChanges(before.m_drawing, image, changes))
-            return std::nullopt;
-        if (changes.Rects().size() > MOST_CHANGED_RECTS)
-            changes = platform::PixelRegion(changes.Bounds());
-        if (m_pointer != before.m_pointer) {
-            changes.Add(before.m_pointer.Rect());
-            changes.Add(m_pointer.Rect());
-        }
-        // It is drawn as a whole, on windows that are drawn anew.
-        if (m_pointer.Touches(changes))
-            changes.Add(m_pointer.Rect());
-        if (!m_drawing.CanDrawPart(changes))
-            return std::nullopt;
-        return changes;
-    }
-
-    /// Whether the pointer is to be drawn with such a part.
-    bool HasPointerIn(const platform::PixelRegion& part) const { return m_pointer.Touches(part); }
-
-private:
-    struct Pointer {
-        platform::CGImageRef image; // null for none
-        platform::CGRect rect;
-        platform::PixelBox box; // within the frame
-
-        platform::PixelRect Rect() const {
-            return {static_cast<int>(box.left), static_cast<int>(box.top), static_cast<int>(box.right),
-                    static_cast<int>(box.bottom)};
-        }
-        bool Touches(const platform::PixelRegion& region) const {
-            platform::PixelRegion common(Rect());
-            common.Intersect(region);
-            return !common.IsEmpty();
-        }
-        bool operator==(const Pointer&) const = default;
-    };
-
-    bool IsSameGround(const Note& other) const {
-        return m_size == other.m_size && m_background == other.m_background;
-    }
-
-    TVLSize m_size{};
-    std::optional<int> m_background; // nothing where none of it is seen
-    platform::WindowImageDrawing m_drawing;
-    Pointer m_pointer;
 };
 
 CShareCGSCapturer::CShareCGSCapturer(const std::shared_ptr<ShareCapturerContext>& context)
@@ -247,7 +166,7 @@ int CShareCGSCapturer::capture(IShareFrame* frame, unsigned display, TVLSize bit
         FitToWindows(pass);
 
     auto* const own = dynamic_cast<CShareFrame*>(frame);
-    std::unique_ptr<Note> before = own != nullptr ? TakeNote(*own) : nullptr;
+    std::unique_ptr<ShareCompositionNote> before = own != nullptr ? TakeNote(*own) : nullptr;
     PrepareFrame(*frame, pass);
     m_rectLastCapture = pass.drawRect;
     if (pass.image != nullptr) {
@@ -262,12 +181,12 @@ int CShareCGSCapturer::capture(IShareFrame* frame, unsigned display, TVLSize bit
 }
 
 /// Null also for a note of somebody else.
-std::unique_ptr<CShareCGSCapturer::Note> CShareCGSCapturer::TakeNote(CShareFrame& frame) {
+std::unique_ptr<ShareCompositionNote> CShareCGSCapturer::TakeNote(CShareFrame& frame) {
     std::unique_ptr<ShareFrameNote> note = frame.TakeNote();
-    auto* const ours = dynamic_cast<Note*>(note.get());
+    auto* const ours = dynamic_cast<ShareCompositionNote*>(note.get());
     if (ours != nullptr)
         static_cast<void>(note.release());
-    return std::unique_ptr<Note>(ours);
+    return std::unique_ptr<ShareCompositionNote>(ours);
 }
 
 void CShareCGSCapturer::PrepareFrame(IShareFrame& frame, const Pass& pass) {
@@ -330,7 +249,7 @@ void CShareCGSCapturer::FindPointer(Pass& pass) {
 // ---- Drawing
 
 /// The frame has no note meanwhile, so that none is left by a drawing that doesn't come to its end.
-void CShareCGSCapturer::Show(const Pass& pass, CShareFrame* frame, const Note* before) {
+void CShareCGSCapturer::Show(const Pass& pass, CShareFrame* frame, const ShareCompositionNote* before) {
     ShareDumpTimeUsage usage;
     const bool isKnown = frame != nullptr && frame->AllowsNote() && Describe(pass);
     const bool isShown =
@@ -346,15 +265,18 @@ void CShareCGSCapturer::Show(const Pass& pass, CShareFrame* frame, const Note* b
 bool CShareCGSCapturer::Describe(const Pass& pass) noexcept {
     try {
         if (m_note == nullptr)
-            m_note = std::make_unique<Note>();
-        return m_note->Describe(pass, m_bmpContext.get());
+            m_note = std::make_unique<ShareCompositionNote>();
+        ShareComposition composition{pass.bitmap, std::nullopt, pass.place, pass.image.get(), pass.pointer};
+        if (!pass.CoversClip(m_bmpContext.get()))
+            composition.background = pass.background;
+        return m_note->Describe(m_bmpContext.get(), composition);
     } catch (const std::bad_alloc&) {
         return false;
     }
 }
 
 /// False when all has to be drawn.
-bool CShareCGSCapturer::DrawChanges(const Pass& pass, const Note& before) {
+bool CShareCGSCapturer::DrawChanges(const Pass& pass, const ShareCompositionNote& before) {
     try {
         const std::optional<platform::PixelRegion> changes = m_note->ChangesSince(before, pass.image.get());
         return changes && DrawPart(pass, *changes);
@@ -374,9 +296,7 @@ bool CShareCGSCapturer::DrawPart(const Pass& pass, const platform::PixelRegion& 
         isWhole &= platform::CGContextDrawWindowImage(m_bmpContext.get(), pass.place, pass.image.get());
     }
     platform::CGContextResetClip(m_bmpContext.get());
-    if (hasPointer)
-        DrawPointer(pass);
-    return isWhole;
+    return (!hasPointer || DrawPointer(pass)) && isWhole;
 }
 
 bool CShareCGSCapturer::DrawAll(const Pass& pass) {
@@ -387,8 +307,7 @@ bool CShareCGSCapturer::DrawAll(const Pass& pass) {
     // Where a layer is missing, the frame may still show an earlier picture.
     if (!isWhole && pass.CoversClip(m_bmpContext.get()))
         FillWhole(m_bmpContext.get(), pass.bitmap, pass.background);
-    DrawPointer(pass);
-    return isWhole;
+    return DrawPointer(pass) && isWhole;
 }
 
 /// Frames are used again and again: what the picture doesn't cover would still show an earlier one, of
@@ -398,9 +317,9 @@ void CShareCGSCapturer::PaintBackground(const Pass& pass) {
         FillWhole(m_bmpContext.get(), pass.bitmap, pass.background);
 }
 
-void CShareCGSCapturer::DrawPointer(const Pass& pass) {
-    if (pass.pointer)
-        platform::CGContextDrawImage(m_bmpContext.get(), pass.pointer->rect, pass.pointer->image.get());
+bool CShareCGSCapturer::DrawPointer(const Pass& pass) {
+    return !pass.pointer ||
+           platform::CGContextDrawImage(m_bmpContext.get(), pass.pointer->rect, pass.pointer->image.get());
 }
 
 // ---- Windows

@@ -15,6 +15,7 @@
 class CShareFrame;
 class IShareFrame;
 class ShareCapturerContext;
+class ShareCompositionNote;
 
 namespace platform {
 class PixelRegion;
@@ -80,24 +81,22 @@ public:
 private:
     /// What a pass has found out so far.
     struct Pass;
-    /// What a frame shows that has come from here.
-    class Note;
 
     bool IsWindowArea() const;
     void FitToWindows(Pass& pass);
     platform::CGRect PlaceOf(const Pass& pass) const;
     void FindPointer(Pass& pass);
-    static std::unique_ptr<Note> TakeNote(CShareFrame& frame);
+    static std::unique_ptr<ShareCompositionNote> TakeNote(CShareFrame& frame);
     void PrepareFrame(IShareFrame& frame, const Pass& pass);
 
     /// Makes the frame show what the pass has found.
-    void Show(const Pass& pass, CShareFrame* frame, const Note* before);
+    void Show(const Pass& pass, CShareFrame* frame, const ShareCompositionNote* before);
     bool Describe(const Pass& pass) noexcept;
-    bool DrawChanges(const Pass& pass, const Note& before);
+    bool DrawChanges(const Pass& pass, const ShareCompositionNote& before);
     bool DrawPart(const Pass& pass, const platform::PixelRegion& part);
     bool DrawAll(const Pass& pass);
     void PaintBackground(const Pass& pass);
-    void DrawPointer(const Pass& pass);
+    bool DrawPointer(const Pass& pass);
 
     std::shared_ptr<ShareCapturerContext> m_shareCapturerContext;
     TVLSize m_sizeBmpContext{};
@@ -109,6 +108,7 @@ private:
     platform::CGContextRef m_bmpContext; // on m_pFrameData
     unsigned char* m_pFrameData = nullptr;
     platform::CGRect m_rectLastCapture;
-    std::unique_ptr<Note> m_note; // of this pass while it lasts, then any that can be written over
+    /// Of this pass while it lasts, then any that can be written over.
+    std::unique_ptr<ShareCompositionNote> m_note;
     bool m_bPointerCaptured = false;
 };
