@@ -122,6 +122,7 @@ bool ShareCGSCapturer::HasContextOn(IShareFrame& frame) const {
 }
 
 void ShareCGSCapturer::updateCaptureFrame(IShareFrame& frame) {
+    CShareFrame::DropNoteOf(frame);
     if (HasContextOn(frame))
         return;
     frame.Reset();

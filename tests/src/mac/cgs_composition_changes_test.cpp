@@ -1,6 +1,7 @@
 // SPDX-License-Identifier: Apache-2.0
 #include "src/mac/cgs_composition.h"
 #include "src/mac/share_capturer_context_mac.h"
+#include "src/mac/share_cgs_capturer.h"
 #include "src/mac/share_util_mac.h"
 #include "tests/src/mac/backend_tools.h"
 #include "tests/support/forwarding_window_server.h"
@@ -258,6 +259,22 @@ TEST_F(CompositionChanges, DrawsWindowsThatAreScaledAsAWhole) {
     desktop->SetContent(2, WithBlock({0, 0, 4, 16}, YELLOW));
     EXPECT_EQ(Painted({100, 60}), (TVLRect{0, 0, 100, 60}));
     EXPECT_EQ(Painted({100, 60}), NOTHING);
+}
+
+TEST_F(CompositionChanges, DrawsAllOverWhatOthersHavePainted) {
+    EXPECT_EQ(Capture(), 0);
+    EXPECT_EQ(ShareUtilMac::FillFrame(frame.Get(), YELLOW, nullptr), 0);
+    EXPECT_EQ(Painted(), ALL);
+    EXPECT_EQ(CountOf(*frame.Get(), YELLOW), 0);
+    ShareCGSCapturer alone;
+    ASSERT_TRUE(alone.init());
+    constexpr unsigned WINDOW = 2;
+    for (int i = 0; i < 2; ++i) { // the second one finds its context as it was
+        EXPECT_EQ(alone.captureScreenRect(ALL, 1, &WINDOW, frame.Get()), 0u);
+        EXPECT_EQ(CountOf(*frame.Get(), BLUE), 0);
+        EXPECT_EQ(Painted(), ALL);
+        EXPECT_EQ(CountOf(*frame.Get(), BLUE), 200 * 120 - 80 * 40);
+    }
 }
 
 // ---- The pointer
