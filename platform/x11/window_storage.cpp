@@ -201,12 +201,15 @@ void WindowStorage::WatchPaintings(Nanoseconds now) {
     m_watchedSince = now;
 }
 
-void WindowStorage::Ask(const std::optional<PixelRegion>& shape, Nanoseconds now) {
-    if (!m_asked || now - *m_asked > WANTED_TIME)
+bool WindowStorage::Ask(const std::optional<PixelRegion>& shape, Nanoseconds now) {
+    const bool isWanted = m_asked && now - *m_asked <= WANTED_TIME;
+    if (!isWanted)
         m_proof.StartNudging(now);
     m_asked = now;
-    if (m_proof.IsProven())
-        return m_paintings.End();
+    if (m_proof.IsProven()) {
+        m_paintings.End();
+        return !isWanted;
+    }
     PixelRegion missing = m_proof.Unproven();
     if (shape)
         missing.Intersect(*shape);
@@ -214,6 +217,7 @@ void WindowStorage::Ask(const std::optional<PixelRegion>& shape, Nanoseconds now
         m_paintings.End();
     else if (!m_paintings.IsOn())
         WatchPaintings(now);
+    return true;
 }
 
 std::optional<std::chrono::nanoseconds> WindowStorage::WatchEnds() const {

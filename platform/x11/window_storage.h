@@ -103,8 +103,9 @@ public:
     // Watching it.
     void WatchPaintings(Nanoseconds now);
     const PaintProof& Proof() const { return m_proof; }
-    /// Somebody asks for it; `shape` is what of it can be seen, nothing for all of it.
-    void Ask(const std::optional<PixelRegion>& shape, Nanoseconds now);
+    /// Somebody asks for it; `shape` is what of it can be seen, nothing for all of it. True when something
+    /// may be due earlier than before.
+    bool Ask(const std::optional<PixelRegion>& shape, Nanoseconds now);
     /// Somebody asks for its last picture, since it isn't on the screen.
     void AskForLast(Nanoseconds now) { m_asked = now; }
     std::optional<Nanoseconds> Asked() const { return m_asked; }

@@ -185,6 +185,8 @@ bool WindowStorages::State::IsOverLimit() const {
 
 void WindowStorages::State::Trim() {
     lastTrim = CmSteadyNow();
+    if (!IsOverLimit()) // with what others hold
+        return;
     std::vector<WindowStorage*> unheld;
     std::size_t kept = wallpaper.KeptBytes();
     for (const auto& [window, storage] : storages) {

@@ -56,7 +56,8 @@ struct WindowStorages::State {
     Traffic traffic;
     std::chrono::nanoseconds lastTrim{0};
     std::chrono::nanoseconds lastPainted = std::chrono::nanoseconds::min();
-    // When something is due, as long as nothing has come that could change it.
+    // When something is due, as long as nothing has come that could make it earlier. What is asked for again
+    // is due later.
     std::optional<std::chrono::nanoseconds> due;
     bool isDueKnown = false;
 };

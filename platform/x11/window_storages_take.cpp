@@ -144,6 +144,7 @@ void WindowStorages::Taking::AddWallpaper(const WindowInfo& info) {
     part.layer.picture =
         m_state.wallpaper.Take(m_state.Tools(), *pixels, m_tree.Wallpaper(), info.frame, fetched);
     m_state.CountTraffic(fetched);
+    m_state.isDueKnown = m_state.isDueKnown && fetched == 0;
     if (part.layer.picture == nullptr)
         return;
     part.layer.frame = {info.frame.origin, part.layer.picture->rect.size};
@@ -176,7 +177,8 @@ void WindowStorages::Taking::AddWindow(const WindowInfo& info, const TopLevel& w
     part.shape = ShapeOf(window);
     part.storage = found->second;
     part.renewals = storage.Renewals();
-    storage.Ask(part.shape, CmSteadyNow());
+    if (storage.Ask(part.shape, CmSteadyNow()))
+        m_state.isDueKnown = false;
     m_parts.push_back(std::move(part));
 }
 
@@ -195,6 +197,9 @@ void WindowStorages::Taking::Fetch() {
         if (part.storage != nullptr && !part.storage->IsCurrent(part.pixels))
             m_fetches.emplace_back(m_state.Tools(), part.storage, part.pixels);
     }
+    if (m_fetches.empty())
+        return;
+    m_state.isDueKnown = false;
     for (StorageFetch& fetch : m_fetches)
         fetch.Ask();
     for (StorageFetch& fetch : m_fetches)
@@ -247,7 +252,6 @@ WindowPictureResult WindowStorages::Take(const WindowPictureRequest& request, Wi
     const Extensions& has = m_state->connection.Has();
     if (!has.composite || !has.damage || !has.xfixes)
         return {PictureOutcome::Unsupported, nullptr};
-    m_state->isDueKnown = false;
     m_state->Trim();
     for (int i = 0; i < FREE_TRIES; ++i) {
         if (auto result = Taking(*m_state, request, tree, pointer).Try(catchUp))

@@ -6,7 +6,10 @@
 #include "platform/x11/x11_worker.h"
 #include "util/cm_guarded_call.h"
 
+#include <pthread.h>
+
 #include <algorithm>
+#include <csignal>
 #include <utility>
 
 namespace platform::x11 {
@@ -15,6 +18,14 @@ namespace {
 
 using Lock = HubState::Lock;
 using Phase = HubState::Phase;
+
+/// Our own threads have it so. A client's may not, and would end its process when it writes to a connection
+/// that has just been closed.
+bool IsBrokenPipeBlocked() {
+    sigset_t blocked;
+    sigemptyset(&blocked);
+    return pthread_sigmask(SIG_BLOCK, nullptr, &blocked) == 0 && sigismember(&blocked, SIGPIPE) == 1;
+}
 
 } // namespace
 
@@ -110,13 +121,8 @@ bool X11Hub::StartThread() {
 
 // ---- Work
 
-PictureOutcome X11Hub::Run(Nanoseconds deadline, Work work) {
-    if (InForkedChild())
-        return PictureOutcome::Lost;
-    const auto command = std::make_shared<Command>();
-    command->work = std::move(work);
-    command->deadline = deadline;
-    Lock lock = m_state->point.Acquire();
+/// Why work can't be run; nothing when it can.
+std::optional<PictureOutcome> X11Hub::WhyNot(Lock& lock, Nanoseconds deadline) {
     AwaitSettled(lock, deadline);
     if (m_state->IsLost(lock))
         return PictureOutcome::Lost;
@@ -124,6 +130,40 @@ PictureOutcome X11Hub::Run(Nanoseconds deadline, Work work) {
         return PictureOutcome::Timeout;
     if (!m_state->IsAlive(lock))
         return PictureOutcome::Lost;
+    return std::nullopt;
+}
+
+PictureOutcome X11Hub::Run(Nanoseconds deadline, Work work) {
+    if (InForkedChild())
+        return PictureOutcome::Lost;
+    const auto command = std::make_shared<Command>();
+    command->work = std::move(work);
+    command->deadline = deadline;
+    Lock lock = m_state->point.Acquire();
+    if (const std::optional<PictureOutcome> reason = WhyNot(lock, deadline))
+        return *reason;
+    return RunThere(lock, command);
+}
+
+PictureOutcome X11Hub::RunHereOrThere(Nanoseconds deadline, const Work& work) {
+    if (InForkedChild())
+        return PictureOutcome::Lost;
+    ConnectionLender* lender = nullptr;
+    if (IsBrokenPipeBlocked()) {
+        Lock lock = m_state->point.Acquire();
+        if (const std::optional<PictureOutcome> reason = WhyNot(lock, deadline))
+            return *reason;
+        lender = m_state->Borrow(lock);
+    }
+    if (lender == nullptr)
+        return Run(deadline, work);
+    const Borrowing borrowing = lender->RunForBorrower(deadline, work);
+    m_state->GiveBack(borrowing);
+    return borrowing.outcome;
+}
+
+PictureOutcome X11Hub::RunThere(Lock& lock, const CommandPtr& command) {
+    const Nanoseconds deadline = *command->deadline;
     m_state->Queue(command, lock);
     while (command->state != Command::State::Done && CmSteadyNow() < deadline)
         m_state->point.WaitUntil(lock, deadline);

@@ -12,12 +12,14 @@
 #include <cstdint>
 #include <functional>
 #include <memory>
+#include <optional>
 #include <string>
 #include <utility>
 
 namespace platform::x11 {
 
 class X11Session;
+struct Command;
 struct HubState;
 
 /// What look-ups answer from. No pointer is null but the cursor's.
@@ -73,6 +75,9 @@ public:
     /// Timeout when the deadline has passed, which makes the server stalled unless it was passed before.
     /// `work` may still run later, so it owns what it uses; and it may throw what X11Connection throws.
     PictureOutcome Run(Nanoseconds deadline, Work work);
+    /// The same, on the caller's own thread if the thread has nothing to do: no other one has to wake up
+    /// then.
+    PictureOutcome RunHereOrThere(Nanoseconds deadline, const Work& work);
     void SetReceiver(std::shared_ptr<NoticeReceiver> receiver);
     /// Null unless the server is alive.
     StreamReaderPtr NewReader(const DisplayStreamRequest& request);
@@ -89,6 +94,8 @@ private:
     explicit X11Hub(std::string display);
 
     bool AwaitSettled(CCmWaitPoint::Lock& lock, Nanoseconds deadline);
+    std::optional<PictureOutcome> WhyNot(CCmWaitPoint::Lock& lock, Nanoseconds deadline);
+    PictureOutcome RunThere(CCmWaitPoint::Lock& lock, const std::shared_ptr<Command>& command);
     template <class Part>
     auto LookAt(Part part) -> decltype(part(std::declval<const View&>()));
     bool StartThread();

@@ -41,6 +41,28 @@ void HubState::Withdraw(const CommandPtr& command, const Lock&) {
     std::erase(m_commands, command);
 }
 
+ConnectionLender* HubState::Borrow(const Lock&) {
+    if (m_lender == nullptr || m_isBorrowed || !m_commands.empty())
+        return nullptr;
+    m_isBorrowed = true;
+    return m_lender;
+}
+
+void HubState::GiveBack(const Borrowing& borrowing) {
+    Lock lock = point.Acquire();
+    m_isBorrowed = false;
+    if (borrowing.isUnanswered)
+        Stall(lock);
+    if (borrowing.isUnanswered || borrowing.isToBeSeenTo) {
+        m_lender = nullptr;
+        Wake();
+    }
+    const bool isAwaited = m_isAwaitedBack;
+    lock.unlock();
+    if (isAwaited)
+        point.NotifyAll();
+}
+
 void HubState::Post(X11Hub::Work work, const Lock& lock) {
     const bool isLost = m_phase == Phase::Settled && m_view.life.life == Life::Lost;
     if (m_phase == Phase::AtRest || isLost || m_closed)
@@ -112,6 +134,21 @@ CommandPtr HubState::TakeCommand() {
     m_commands.pop_front();
     command->state = Command::State::Running;
     return command;
+}
+
+void HubState::Lend(ConnectionLender& lender) {
+    const Lock lock = point.Acquire();
+    m_lender = &lender;
+}
+
+void HubState::TakeBack() {
+    Lock lock = point.Acquire();
+    m_lender = nullptr;
+    while (m_isBorrowed) {
+        m_isAwaitedBack = true;
+        point.Wait(lock);
+    }
+    m_isAwaitedBack = false;
 }
 
 void HubState::Finish(const CommandPtr& command, PictureOutcome outcome) {

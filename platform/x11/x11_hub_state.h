@@ -35,6 +35,21 @@ struct Command {
 };
 using CommandPtr = std::shared_ptr<Command>;
 
+/// How the work of somebody who has borrowed the connection has ended.
+struct Borrowing {
+    PictureOutcome outcome = PictureOutcome::Failed;
+    bool isUnanswered = false; ///< The server didn't answer in time.
+    bool isToBeSeenTo = false; ///< The thread has something to do now.
+};
+
+/// Who lends the connection, while he has nothing to do with it.
+class ConnectionLender {
+public:
+    virtual ~ConnectionLender() = default;
+    /// Runs the work on the calling thread, to which nobody else may lend it meanwhile. Throws nothing.
+    virtual Borrowing RunForBorrower(std::chrono::nanoseconds deadline, const X11Hub::Work& work) = 0;
+};
+
 /// What the hub's two sides share: its users' (X11Hub) and its thread's (X11Worker).
 /// Threads: any. Operations with a lock need the point's.
 struct HubState {
@@ -64,6 +79,10 @@ struct HubState {
     /// Work that is done in its order as soon as the server answers, and dropped with the connection.
     void Post(X11Hub::Work work, const Lock&);
     void Withdraw(const CommandPtr& command, const Lock&);
+    /// Null when the thread needs the connection itself, or somebody else has it. Else it is to be given
+    /// back.
+    ConnectionLender* Borrow(const Lock&);
+    void GiveBack(const Borrowing& borrowing);
     /// Somebody has waited in vain: all who still wait fail.
     void Stall(const Lock&);
     void SetReceiver(std::shared_ptr<NoticeReceiver>& receiver, const Lock&);
@@ -79,6 +98,9 @@ struct HubState {
 
     bool IsStalled();
     CommandPtr TakeCommand();
+    void Lend(ConnectionLender& lender);
+    /// Waits until nobody has borrowed it.
+    void TakeBack();
     void Finish(const CommandPtr& command, PictureOutcome outcome);
     /// A session has begun, and `view` is what it has found. `sameServer`: as far as the server can tell, it
     /// is the one that there was before the rest.
@@ -121,6 +143,9 @@ private:
     std::uint64_t m_lastReader = 0;
     std::shared_ptr<NoticeReceiver> m_receiver;
     int m_wakes = -1;
+    ConnectionLender* m_lender = nullptr;
+    bool m_isBorrowed = false;
+    bool m_isAwaitedBack = false;
 
     std::atomic<std::uint64_t> m_epoch{0};
 };

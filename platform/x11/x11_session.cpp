@@ -98,6 +98,7 @@ void X11Session::SetComposited(bool composited) {
 // ---- Events in
 
 void X11Session::Dispatch(const xcb_generic_event_t& event) {
+    ++m_events;
     const std::uint8_t fixes = m_connection.Has().xfixesEvent;
     if (fixes != 0 && (event.response_type & 0x7F) == fixes + XCB_XFIXES_SELECTION_NOTIFY) {
         m_compositorUnknown = true;

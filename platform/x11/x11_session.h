@@ -12,6 +12,7 @@
 #include "platform/x11/x11_memory.h"
 
 #include <chrono>
+#include <cstdint>
 #include <deque>
 #include <functional>
 #include <memory>
@@ -55,6 +56,8 @@ public:
     void CatchUp(EventsFrom from);
     std::optional<std::chrono::nanoseconds> NextDue() const;
     void DoDue();
+    /// Grows with each event that was taken in.
+    std::uint64_t EventsSoFar() const { return m_events; }
     /// What else than the connection is to be waited on. When one is readable, DoDue has something to do.
     std::vector<int> Descriptors() const { return m_applications.Descriptors(); }
     void OnDescriptorReady() { m_processEnded = true; }
@@ -97,7 +100,8 @@ private:
     PointerWatch m_pointer;
     bool m_composited = false;
     bool m_compositorUnknown = false; // another one may be there, or none
-    bool m_unfinished = false;        // more came than was taken in
+    std::uint64_t m_events = 0;
+    bool m_unfinished = false; // more came than was taken in
     std::uint64_t m_treeRevision = 0;
     std::vector<ApplicationWindow> m_applicationWindows;
     bool m_processEnded = false;

@@ -71,8 +71,8 @@ bool X11WindowServer::GetPointerPosition(CGPoint& position) const {
     const auto found = std::make_shared<std::optional<CGPoint>>();
     PictureOutcome outcome = PictureOutcome::Failed;
     CmCallGuarded("[X11WindowServer::GetPointerPosition]>>exception: ", [&] {
-        outcome = m_hub->Run(CmSteadyNow() + POINTER_LIMIT,
-                             [found](X11Session& session) { *found = session.PointerPosition(); });
+        outcome = m_hub->RunHereOrThere(CmSteadyNow() + POINTER_LIMIT,
+                                        [found](X11Session& session) { *found = session.PointerPosition(); });
     });
     if (outcome != PictureOutcome::Ok || !*found)
         return false;
@@ -92,7 +92,7 @@ WindowPictureResult X11WindowServer::TakeWindowPicture(const WindowPictureReques
             WindowPictureResult result;
         };
         const auto taking = std::make_shared<Taking>(Taking{request, {}});
-        result.outcome = m_hub->Run(request.deadline, [taking](X11Session& session) {
+        result.outcome = m_hub->RunHereOrThere(request.deadline, [taking](X11Session& session) {
             taking->result = session.TakeWindowPicture(taking->request);
         });
         if (result.outcome == PictureOutcome::Ok)

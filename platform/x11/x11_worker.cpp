@@ -6,6 +6,7 @@
 #include "util/cm_guarded_call.h"
 #include "util/cm_trace.h"
 
+#include <sys/epoll.h>
 #include <sys/eventfd.h>
 #include <sys/socket.h>
 
@@ -52,7 +53,7 @@ timespec SpanOf(std::chrono::nanoseconds time) {
 
 std::shared_ptr<X11Worker> X11Worker::Start(HubState& hub, const std::string& display) {
     auto worker = std::make_shared<X11Worker>(hub, display);
-    if (!worker->m_stops || !worker->m_wakes)
+    if (!worker->m_stops || !worker->m_wakes || !worker->m_arrivals)
         return nullptr;
     hub.BeginPhase(HubState::Phase::Connecting, worker->m_wakes.Get(), hub.point.Acquire());
     if (worker->Create("scn-x11", 0, 0, 0) == 0)
@@ -66,6 +67,7 @@ X11Worker::X11Worker(HubState& hub, const std::string& display)
       m_display(display),
       m_stops(NewEvents()),
       m_wakes(NewEvents()),
+      m_arrivals(epoll_create1(EPOLL_CLOEXEC)),
       m_backOff(FIRST_BACK_OFF) {}
 
 void X11Worker::End() {
@@ -116,6 +118,8 @@ bool X11Worker::BeginSession() {
             return false;
         m_connection.emplace(std::move(link), m_stops.Get());
         NoteSocket(m_connection->Descriptor());
+        if (!HearArrivals(EPOLL_CTL_ADD, EPOLLIN))
+            return false;
         m_connection->SetDeadline(CmSteadyNow() + DEFAULT_CONNECT_DEADLINE);
         m_connection->Introduce();
         m_view = View();
@@ -149,9 +153,18 @@ void X11Worker::Pause() {
 void X11Worker::EndSession() {
     m_question = {};
     m_asked = false;
+    m_failure = nullptr;
     m_session.reset();
     NoteSocket(-1);
+    if (m_connection)
+        HearArrivals(EPOLL_CTL_DEL, 0); // a forked child may still have the socket open
     m_connection.reset();
+}
+
+bool X11Worker::HearArrivals(int operation, std::uint32_t events) {
+    epoll_event event{};
+    event.events = events;
+    return epoll_ctl(m_arrivals.Get(), operation, m_connection->Descriptor(), &event) == 0;
 }
 
 void X11Worker::NoteSocket(int socket) {
@@ -237,9 +250,8 @@ void X11Worker::RunCommand(const CommandPtr& command) {
     PictureOutcome outcome = PictureOutcome::Failed;
     const auto finish = [&] { m_hub.Finish(command, outcome); };
     try {
-        m_connection->SetDeadline(command->deadline.value_or(CmSteadyNow() + PATIENCE));
-        command->work(*m_session);
-        outcome = PictureOutcome::Ok;
+        if (Perform(command->work, command->deadline.value_or(CmSteadyNow() + PATIENCE)))
+            outcome = PictureOutcome::Ok;
     } catch (const Lost&) {
         outcome = PictureOutcome::Lost;
         finish();
@@ -248,21 +260,80 @@ void X11Worker::RunCommand(const CommandPtr& command) {
         outcome = GetStopFlag() ? PictureOutcome::Lost : PictureOutcome::Timeout;
         finish();
         throw;
-    } catch (const std::exception& error) {
-        CmTraceError("[X11Worker::RunCommand]>>exception: ", error.what());
     }
     finish();
 }
+
+/// False when it has failed by itself.
+bool X11Worker::Perform(const X11Hub::Work& work, Nanoseconds deadline) {
+    m_connection->SetDeadline(deadline);
+    try {
+        work(*m_session);
+        return true;
+    } catch (const Lost&) {
+        throw;
+    } catch (const Unanswered&) {
+        throw;
+    } catch (const std::exception& error) {
+        CmTraceError("[X11Worker::Perform]>>exception: ", error.what());
+        return false;
+    }
+}
+
+// ---- Lending
+
+/// The thread sleeps meanwhile, and what it would do after the work is done here.
+Borrowing X11Worker::RunForBorrower(Nanoseconds deadline, const X11Hub::Work& work) {
+    Borrowing borrowing;
+    const std::uint64_t events = m_session->EventsSoFar();
+    try {
+        if (!HearArrivals(EPOLL_CTL_MOD, 0))
+            CmTraceWarning("[X11Worker::RunForBorrower]>>can't be undisturbed");
+        if (Perform(work, deadline))
+            borrowing.outcome = PictureOutcome::Ok;
+        m_session->CatchUp(EventsFrom::Answers);
+        m_connection->Flush();
+        borrowing.isToBeSeenTo = HasMoreToDo(events);
+    } catch (const Unanswered&) {
+        if (borrowing.outcome != PictureOutcome::Ok)
+            borrowing.outcome = GetStopFlag() ? PictureOutcome::Lost : PictureOutcome::Timeout;
+        borrowing.isUnanswered = !GetStopFlag();
+    } catch (...) {
+        if (borrowing.outcome != PictureOutcome::Ok)
+            borrowing.outcome = PictureOutcome::Lost;
+        m_failure = std::current_exception();
+        borrowing.isToBeSeenTo = true;
+    }
+    if (!HearArrivals(EPOLL_CTL_MOD, EPOLLIN)) {
+        m_failure = std::make_exception_ptr(Lost());
+        borrowing.isToBeSeenTo = true;
+    }
+    return borrowing;
+}
+
+/// Something is due before the thread wakes up, or it may have other things to wait on.
+bool X11Worker::HasMoreToDo(std::uint64_t eventsBefore) const {
+    const std::optional<Nanoseconds> due = m_session->NextDue();
+    return m_session->EventsSoFar() != eventsBefore || (due && *due < m_wakeTime);
+}
+
+// ---- Sleeping
 
 void X11Worker::Wait() {
     const Nanoseconds longest = TimeToNextDue();
     if (longest <= Nanoseconds::zero())
         return;
     std::vector<pollfd> waits = ServerWaits(POLLIN);
+    waits[0].fd = m_arrivals.Get();
     const auto ofSession = static_cast<std::ptrdiff_t>(waits.size());
     for (const int descriptor : m_session->Descriptors())
         waits.push_back({descriptor, POLLIN, 0});
+    m_wakeTime = m_session->NextDue().value_or(Nanoseconds::max());
+    m_hub.Lend(*this);
     WaitFor(waits, longest);
+    m_hub.TakeBack();
+    if (m_failure)
+        std::rethrow_exception(std::exchange(m_failure, nullptr));
     if (std::any_of(waits.begin() + ofSession, waits.end(),
                     [](const pollfd& wait) { return wait.revents != 0; }))
         m_session->OnDescriptorReady();

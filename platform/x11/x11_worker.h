@@ -9,6 +9,8 @@
 #include <poll.h>
 
 #include <chrono>
+#include <cstdint>
+#include <exception>
 #include <memory>
 #include <mutex>
 #include <optional>
@@ -18,8 +20,9 @@
 namespace platform::x11 {
 
 /// The thread of a window server: it owns the connection and whatever goes on over it, and keeps the hub's
-/// view true.
-class X11Worker final : public ACmThread, private SessionListener {
+/// view true. While it sleeps it lends the connection to one who needs a picture: meanwhile what comes
+/// doesn't wake it.
+class X11Worker final : public ACmThread, public ConnectionLender, private SessionListener {
 public:
     /// Null when it can't be started. The hub is in its first try to connect then.
     static std::shared_ptr<X11Worker> Start(HubState& hub, const std::string& display);
@@ -31,6 +34,7 @@ public:
     void End();
 
     int OnThreadRun() override;
+    Borrowing RunForBorrower(std::chrono::nanoseconds deadline, const X11Hub::Work& work) override;
 
 private:
     using Nanoseconds = std::chrono::nanoseconds;
@@ -43,6 +47,7 @@ private:
     void EndSession();
     void Lose();
     void NoteSocket(int socket);
+    bool HearArrivals(int operation, std::uint32_t events);
 
     // Serving.
     void ServeGuarded();
@@ -50,6 +55,8 @@ private:
     void ServeStalled();
     void RunCommands();
     void RunCommand(const CommandPtr& command);
+    bool Perform(const X11Hub::Work& work, Nanoseconds deadline);
+    bool HasMoreToDo(std::uint64_t eventsBefore) const;
     void Wait();
     void WaitForServer(short events);
     /// `waits` begins with those of ServerWaits.
@@ -69,13 +76,17 @@ private:
     const std::string m_display;
     const OwnedDescriptor m_stops; // readable when the thread is to end
     const OwnedDescriptor m_wakes; // readable when the hub has something for it
+    /// Readable when the connection is, but not while somebody has borrowed it.
+    const OwnedDescriptor m_arrivals;
     std::optional<X11Connection> m_connection;
     std::optional<X11Session> m_session;
     bool m_lossUntold = false;
     Milliseconds m_backOff;
     Pending<xcb_get_input_focus_reply_t> m_question; // whether a stalled server answers
     bool m_asked = false;
-    bool m_isReadable = false; // the connection has something that nobody has read
+    Nanoseconds m_wakeTime{0};    // until when it sleeps
+    std::exception_ptr m_failure; // of a borrower, for the thread to see to
+    bool m_isReadable = false;    // the connection has something that nobody has read
     View m_view;
     bool m_publishes = false; // not before all of a new session is there
 

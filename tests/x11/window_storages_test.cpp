@@ -497,7 +497,7 @@ TEST(WindowStorages, ForgetPicturesThatNobodyAsksForAnyMore) {
     ASSERT_TRUE(IsAll(bench.TakeOne(window), GREEN));
     EXPECT_EQ(fetches(), 1U);
     ASSERT_TRUE(bench.Storages().NextDue());
-    EXPECT_EQ(*bench.Storages().NextDue(), CmSteadyNow() + WindowStorages::CACHE_TIME);
+    EXPECT_LE(*bench.Storages().NextDue(), CmSteadyNow() + WindowStorages::CACHE_TIME);
     clock->Advance(5s);
     bench.Storages().DoDue();
     ASSERT_TRUE(IsAll(bench.TakeOne(window), GREEN));
