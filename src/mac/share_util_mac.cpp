@@ -72,10 +72,10 @@ bool IsOwnedBy(platform::CGSConnectionID connection, unsigned window) {
            owner == connection;
 }
 
-int ListInto(std::vector<int>& windows, int size) {
+int ListInto(platform::CGSConnectionID connection, std::vector<int>& windows, int size) {
     windows.assign(static_cast<std::size_t>(size), 0);
     int read = 0;
-    platform::CGSGetOnScreenWindowList(platform::CGSDefaultConnection(), 0, size, windows.data(), &read);
+    platform::CGSGetOnScreenWindowList(connection, 0, size, windows.data(), &read);
     return read;
 }
 
@@ -114,13 +114,14 @@ void ShareUtilMac::GetRGBfromInt(int colour, float& red, float& green, float& bl
 }
 
 int ShareUtilMac::GetOnScreenWindowList(std::vector<int>& windows) {
+    const platform::CGSConnectionID connection = platform::CGSDefaultConnection();
     int count = 0;
-    platform::CGSGetOnScreenWindowCount(platform::CGSDefaultConnection(), 0, &count);
+    platform::CGSGetOnScreenWindowCount(connection, 0, &count);
     int size = count + LIST_SLACK;
-    int read = ListInto(windows, size);
+    int read = ListInto(connection, windows, size);
     if (read > size) {
         size = read + LIST_SLACK;
-        read = ListInto(windows, size);
+        read = ListInto(connection, windows, size);
     }
     if (read > size)
         CmTraceWarning("GetOnScreenWindowList incorrect windows list count", ", windowCount=", size,
