@@ -1,6 +1,7 @@
 // SPDX-License-Identifier: Apache-2.0
 #include "tests/src/mac/share_capturer_context_mac_tools.h"
 #include "tests/support/memory_failure.h"
+#include "tests/support/threads.h"
 #include "tests/support/trace_log.h"
 
 #include <gtest/gtest.h>
@@ -47,6 +48,7 @@ TEST_F(WindowWalk, ShowsNothingWhenItRunsOutOfMemory) {
 }
 
 TEST_F(WindowWalk, NeedsNoMemoryWhileItsLastWalkStands) {
+    const CManualClockScope clock;
     ShareApp();
     WalkOver({Window(1, SHARED_APP, {10, 10, 60, 60}), Window(2, OTHER_APP, {30, 30, 80, 80})});
     Walk();
@@ -63,6 +65,7 @@ TEST_F(WindowWalk, NeedsNoMemoryWhileItsLastWalkStands) {
 }
 
 TEST_F(WindowWalk, IsMadeAgainWhenItLackedMemory) {
+    const CManualClockScope clock; // no pin runs out because the machine is busy
     ReserveEdges(0, 0, 0, 20);
     SetStack({Window(1, SHARED_APP, {10, 10, 160, 120}), Window(2, OTHER_APP, {30, 30, 80, 80}),
               Window(3, SHARED_APP, {60, 60, 260, 90})});
