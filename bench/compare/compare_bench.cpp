@@ -15,16 +15,18 @@
 
 namespace {
 
-void RunOn(XServerOptions::Kind kind, const BenchOptions& options, BenchResults& results) {
+/// Whether nothing has failed; a machine that can't run the server is no failure.
+bool RunOn(XServerOptions::Kind kind, const BenchOptions& options, BenchResults& results) {
     const std::unique_ptr<XServer> server = StartBenchServer(kind);
     if (server == nullptr)
-        return;
+        return true;
     Comparison comparison(*server, options, FindPeers(), results);
     comparison.RunShares();
     comparison.RunChanges();
     comparison.RunWindows();
     comparison.RunCaptures();
     comparison.RunLists();
+    return comparison.HasSucceeded();
 }
 
 } // namespace
@@ -37,8 +39,9 @@ int main(int argc, char** argv) {
         BenchResults results;
         if (options.servers.size() != 1)
             throw std::invalid_argument("rows don't tell servers apart: compare on one of them");
-        RunOn(options.servers.front(), options, results);
-        return options.out.empty() || results.Write(options.out) ? EXIT_SUCCESS : EXIT_FAILURE;
+        const bool succeeded = RunOn(options.servers.front(), options, results);
+        const bool written = options.out.empty() || results.Write(options.out);
+        return succeeded && written ? EXIT_SUCCESS : EXIT_FAILURE;
     } catch (const std::exception& failure) {
         std::fprintf(stderr, "compare_bench: %s\n", failure.what());
         return EXIT_FAILURE;

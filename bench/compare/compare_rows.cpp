@@ -110,11 +110,26 @@ void Comparison::RunCaptures() {
     }
 }
 
-void Comparison::Run(Plan plan) {
-    ComparedRow row{PREFIX + plan.row, {}, {}, plan.goal};
-    if (!m_options.Wants(row.name))
+void Comparison::Run(const Plan& plan) {
+    const std::string row = PREFIX + plan.row;
+    if (!m_options.Wants(row))
         return;
     TellHeaderOnce();
+    try {
+        Measure(plan, row);
+    } catch (const std::runtime_error& failure) {
+        Fail(row, failure);
+    }
+}
+
+void Comparison::Fail(const std::string& row, const std::exception& failure) {
+    std::printf("%s FAILED: %s\n", row.c_str(), failure.what());
+    std::fflush(stdout);
+    m_succeeded = false;
+}
+
+void Comparison::Measure(Plan plan, const std::string& name) {
+    ComparedRow row{name, {}, {}, plan.goal};
     SceneProcess playing(m_server.Display(), plan.scene);
     if (plan.scene.covered)
         plan.subject.window = playing.Window();
@@ -174,14 +189,22 @@ void Comparison::RunLists() {
     const std::string row = PREFIX + "list/" + std::to_string(WINDOWS);
     if (!m_options.Wants(row))
         return;
-    const SceneProcess scene(m_server.Display(), SceneOfWindows(WINDOWS));
+    try {
+        ListAll(row, WINDOWS);
+    } catch (const std::runtime_error& failure) {
+        Fail(row, failure);
+    }
+}
+
+void Comparison::ListAll(const std::string& row, int windows) {
+    const SceneProcess scene(m_server.Display(), SceneOfWindows(windows));
     std::printf("\n%s: microseconds for each window of a list, medians [lowest .. highest]\n", row.c_str());
     std::vector<Peer> listers{m_peers.front()};
     const auto webrtc = std::find_if(m_peers.begin(), m_peers.end(), IsWebrtc);
     if (webrtc != m_peers.end())
         listers.push_back(*webrtc); // how it looks for changes makes no difference to lists
     for (const Peer& peer : listers)
-        List(peer, row, WINDOWS);
+        List(peer, row, windows);
 }
 
 void Comparison::List(const Peer& peer, const std::string& row, int windows) {
