@@ -4,6 +4,8 @@
 #include "bench/meter/scenes.h"
 #include "bench/meter/x11_bench.h"
 
+#include <signal.h>
+
 #include <cstdio>
 #include <cstdlib>
 #include <exception>
@@ -22,6 +24,7 @@ bool RunOn(XServerOptions::Kind kind, const BenchOptions& options, BenchResults&
         return true;
     Comparison comparison(*server, options, FindPeers(), results);
     comparison.RunShares();
+    comparison.RunSmallWindows();
     comparison.RunChanges();
     comparison.RunWindows();
     comparison.RunCaptures();
@@ -34,6 +37,7 @@ bool RunOn(XServerOptions::Kind kind, const BenchOptions& options, BenchResults&
 int main(int argc, char** argv) {
     if (const auto played = PlaySceneIfAsked(argc, argv))
         return *played;
+    signal(SIGPIPE, SIG_IGN); // a driver that has ended is told, and no reason to end
     try {
         const BenchOptions options = ReadBenchOptions(argc, argv);
         BenchResults results;

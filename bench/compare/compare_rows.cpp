@@ -85,6 +85,15 @@ void Comparison::RunShares() {
     }
 }
 
+void Comparison::RunSmallWindows() {
+    constexpr int WIDTH = 800;
+    constexpr int HEIGHT = 600;
+    for (const Scene& scene : {Scene{"static", 0, 0, 0, 0, true, WIDTH, HEIGHT},
+                               Scene{"typing", 300, 20, 10, 0, true, WIDTH, HEIGHT},
+                               Scene{"full_motion", WIDTH, HEIGHT, 30, 0, true, WIDTH, HEIGHT}})
+        Run({"small_window/" + scene.name, scene, {}, Rivals(), std::nullopt});
+}
+
 void Comparison::RunChanges() {
     for (const double part : {0.0, 1 / 64.0, 1 / 16.0, 1 / 4.0, 1 / 2.0, 1.0}) {
         const Scene scene = SceneOfChange(part, m_server.Options().width, m_server.Options().height);
@@ -169,7 +178,8 @@ void Comparison::Verify(RunningPeer& peer, const Scene& scene) const {
     constexpr int Y = 27;
     if (scene.windows > 0)
         return; // nothing is painted in that corner
-    const bool moves = scene.width >= m_server.Options().width;
+    const int whole = scene.windowWidth > 0 ? scene.windowWidth : m_server.Options().width;
+    const bool moves = scene.width >= whole;
     const std::uint32_t seen = peer.PixelAt(X, Y);
     const bool right = moves ? seen == ColourOfSquares(X, Y, 1) || seen == ColourOfSquares(X, Y, 2)
                              : seen == ColourOfSquares(X, Y, 0);

@@ -21,6 +21,8 @@ public:
 
     /// Shares of the screen, and of one window that another one covers.
     void RunShares();
+    /// Of a covered window of 800x600.
+    void RunSmallWindows();
     /// Cost against the part of the screen that changes.
     void RunChanges();
     /// Cost against the number of windows that stand still.

@@ -39,9 +39,10 @@ void TellPeer(const ComparedRow& row, const PeerCosts& peer, const PeerCosts* be
             {{"ratio", ratio.median}, {"ratio_lowest", ratio.lowest}, {"ratio_highest", ratio.highest}});
         std::printf(" %6.2f [%5.2f ..%5.2f]", ratio.median, ratio.lowest, ratio.highest);
     }
-    if (row.goal && &peer == &row.peers.front()) {
+    if (best != nullptr && row.goal && &peer == &row.peers.front()) {
         values.emplace_back("goal", *row.goal);
-        std::printf("  goal %.2f", *row.goal);
+        std::printf("  goal %.2f %s", *row.goal,
+                    RatioOf(peer.costs, best->costs).median <= *row.goal ? "met" : "missed");
     }
     std::printf("\n");
     results.Add(row.name + "/" + peer.peer.name, values);

@@ -22,7 +22,7 @@
 namespace {
 
 constexpr const char* SCENE_WORD = "--play-scene";
-constexpr int ARGUMENTS = 9;
+constexpr int ARGUMENTS = 11;
 constexpr int READY_MS = 30000;
 
 // ---- In the scene's own process
@@ -84,13 +84,20 @@ bool IsExposure(xcb_generic_event_t* event) {
     std::exit(EXIT_FAILURE);
 }
 
-/// A window as large as the desktop, and what is painted in it. Like any program it paints anew what the
+xcb_rectangle_t PlaceOf(const XLink& link, const Scene& scene) {
+    if (scene.windowWidth > 0)
+        return {0, 0, static_cast<std::uint16_t>(scene.windowWidth),
+                static_cast<std::uint16_t>(scene.windowHeight)};
+    return {0, 0, link.Screen().width_in_pixels, link.Screen().height_in_pixels};
+}
+
+/// A window, and what is painted in it. Like any program it paints anew what the
 /// server asks for, as it does of covered windows once somebody wants to see all of them.
 class Stage {
 public:
     Stage(const XLink& link, const Scene& scene)
         : m_link(link),
-          m_size{0, 0, link.Screen().width_in_pixels, link.Screen().height_in_pixels},
+          m_size(PlaceOf(link, scene)),
           m_window(MapWindow(link, m_size, scene.name)),
           m_context(xcb_generate_id(link.Get())),
           m_desktop(link.Get(), m_size.width, m_size.height) {
@@ -216,10 +223,10 @@ private:
 } // namespace
 
 const std::vector<Scene>& MovingScenes() {
-    static const std::vector<Scene> scenes{{"static", 0, 0, 0, 0, false},
-                                           {"typing", 300, 20, 10, 0, false},
-                                           {"video", 1280, 720, 30, 0, false},
-                                           {"full_motion", 1920, 1080, 30, 0, false}};
+    static const std::vector<Scene> scenes{{"static", 0, 0, 0, 0, false, 0, 0},
+                                           {"typing", 300, 20, 10, 0, false, 0, 0},
+                                           {"video", 1280, 720, 30, 0, false, 0, 0},
+                                           {"full_motion", 1920, 1080, 30, 0, false, 0, 0}};
     return scenes;
 }
 
@@ -232,11 +239,13 @@ Scene SceneOfChange(double part, int desktopWidth, int desktopHeight) {
             static_cast<int>(std::lround(desktopHeight * side)),
             30,
             0,
-            false};
+            false,
+            0,
+            0};
 }
 
 Scene SceneOfWindows(int count) {
-    return {"windows", 0, 0, 0, count, false};
+    return {"windows", 0, 0, 0, count, false, 0, 0};
 }
 
 SceneProcess::SceneProcess(const std::string& display, const Scene& scene) {
@@ -250,7 +259,9 @@ SceneProcess::SceneProcess(const std::string& display, const Scene& scene) {
                     std::to_string(scene.height),
                     std::to_string(scene.framesPerSecond),
                     std::to_string(scene.windows),
-                    std::to_string(static_cast<int>(scene.covered))};
+                    std::to_string(static_cast<int>(scene.covered)),
+                    std::to_string(scene.windowWidth),
+                    std::to_string(scene.windowHeight)};
     plan.output = pipe.Writer();
     m_process = std::make_unique<CChildProcess>(plan);
     pipe.CloseWriter();
@@ -265,7 +276,7 @@ std::optional<int> PlaySceneIfAsked(int argc, const char* const* argv) {
         return std::nullopt;
     try {
         Play(argv[2], {argv[3], std::stoi(argv[4]), std::stoi(argv[5]), std::stoi(argv[6]),
-                       std::stoi(argv[7]), std::stoi(argv[8]) != 0});
+                       std::stoi(argv[7]), std::stoi(argv[8]) != 0, std::stoi(argv[9]), std::stoi(argv[10])});
     } catch (const std::exception&) {
         return EXIT_FAILURE;
     }

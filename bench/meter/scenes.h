@@ -12,11 +12,13 @@
 /// ours, by way of shared memory, so that it costs the server little.
 struct Scene {
     std::string name;
-    int width = 0; ///< Of what changes; it lies in a window that fills the desktop.
+    int width = 0; ///< Of what changes; it lies in the middle of a window.
     int height = 0;
     int framesPerSecond = 0;
     int windows = 0;      ///< In place of all that: so many small windows with titles, which stand still.
     bool covered = false; ///< By another window, of the same size and opaque; and kept whole in a storage.
+    int windowWidth = 0;  ///< Of the window, in the desktop's top left corner; it fills the desktop for 0.
+    int windowHeight = 0;
 };
 
 /// static; typing, 300x20 at 10 Hz; video, 1280x720 at 30 Hz; full motion, 1920x1080 at 30 Hz.
