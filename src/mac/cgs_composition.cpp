@@ -354,12 +354,8 @@ int CShareCGSCapturer::createShareImage(const platform::CGRect& rect, platform::
 
 bool CShareCGSCapturer::getCaptureWindows(std::vector<int>& windows) {
     ShareUtilMac::GetOnScreenWindowList(windows);
-    const auto isKeptOut = [this](int id) {
-        const auto window = static_cast<unsigned>(id);
-        return !isWindowShared(window) ||
-               (m_shareCapturerContext != nullptr && m_shareCapturerContext->MayBeKeptOut(window));
-    };
-    windows.erase(std::remove_if(windows.begin(), windows.end(), isKeptOut), windows.end());
+    if (m_shareCapturerContext != nullptr)
+        m_shareCapturerContext->KeepShared(windows);
     return true;
 }
 
