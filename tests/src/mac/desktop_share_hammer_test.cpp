@@ -81,8 +81,8 @@ Seen CaptureThroughUnrest(MakeCapturer make, const SimulatedLie* lie, int captur
 
 void ExpectAliveWithoutLeaks(const Seen& seen) {
     EXPECT_EQ(seen.leaks, 0);
-    EXPECT_GT(seen.frames, 20);
-    EXPECT_GT(seen.kept, 10000);
+    EXPECT_GT(seen.frames, TestRounds(20));
+    EXPECT_GT(seen.kept, TestRounds(10000));
 }
 
 } // namespace
