@@ -277,8 +277,8 @@ TEST_F(PlatformLife, AForkedChildFindsNoLockTakenAndNothingToWaitFor) {
 }
 
 TEST_F(PlatformLife, AProcessMayEndWithoutARest) {
-    // In a child of its own, which starts its own threads and leaves by exit. Not a fork of this process, whose
-    // other threads may hold any lock.
+    // In a child of its own, which starts its own threads and leaves by exit. Not a fork of this process,
+    // whose other threads may hold any lock.
     GTEST_FLAG_SET(death_test_style, "threadsafe");
     EXPECT_EXIT(
         {
