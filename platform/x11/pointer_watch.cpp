@@ -2,9 +2,11 @@
 #include "platform/x11/pointer_watch.h"
 
 #include "platform/x11/reply_bytes.h"
+#include "platform/x11/server_event.h"
 #include "util/cm_clock.h"
 
 #include <xcb/xfixes.h>
+#include <xcb/xinput.h>
 
 #include <algorithm>
 #include <cstddef>
@@ -19,6 +21,12 @@ using Bytes = std::vector<std::uint8_t>;
 
 /// Far above what people can still point with.
 constexpr int LARGEST_SIDE = 1024;
+
+/// Whatever moves the pointer, whoever has grabbed the device.
+constexpr std::uint32_t MOTIONS =
+    XCB_INPUT_XI_EVENT_MASK_RAW_MOTION | XCB_INPUT_XI_EVENT_MASK_RAW_BUTTON_PRESS |
+    XCB_INPUT_XI_EVENT_MASK_RAW_BUTTON_RELEASE | XCB_INPUT_XI_EVENT_MASK_RAW_TOUCH_BEGIN |
+    XCB_INPUT_XI_EVENT_MASK_RAW_TOUCH_UPDATE | XCB_INPUT_XI_EVENT_MASK_RAW_TOUCH_END;
 
 /// The server has words of alpha, red, green and blue. No colour may exceed its alpha, and clients draw
 /// cursors that do.
@@ -99,6 +107,11 @@ void PointerWatch::Read() {
 }
 
 bool PointerWatch::OnEvent(const xcb_generic_event_t& event) {
+    if (IsMotion(event)) {
+        if (std::exchange(m_isWatched, false))
+            SelectMotion(0);
+        return false;
+    }
     const std::uint8_t first = m_connection.Has().xfixesEvent;
     if (first == 0 || (event.response_type & 0x7F) != first + XCB_XFIXES_CURSOR_NOTIFY)
         return false;
@@ -127,6 +140,34 @@ std::optional<CGPoint> PointerWatch::Position() {
     if (reply == nullptr || reply->same_screen == 0)
         return std::nullopt;
     return CGPoint{static_cast<float>(reply->root_x), static_cast<float>(reply->root_y)};
+}
+
+// ---- Motion
+
+std::optional<CGPoint> PointerWatch::WatchedPosition() {
+    // What is told between the two requests is looked at later, and taken for news.
+    if (!m_isWatched && m_connection.Has().xinput) {
+        SelectMotion(MOTIONS);
+        m_isWatched = true;
+    }
+    m_position.reset();
+    m_position = Position();
+    return m_position;
+}
+
+void PointerWatch::SelectMotion(std::uint32_t kinds) {
+    const struct {
+        xcb_input_event_mask_t head;
+        std::uint32_t kinds;
+    } mask{{XCB_INPUT_DEVICE_ALL_MASTER, 1}, kinds};
+    xcb_input_xi_select_events(m_connection.Get(), m_connection.Root(), 1, &mask.head);
+}
+
+/// We ask for no other kinds.
+bool PointerWatch::IsMotion(const xcb_generic_event_t& event) const {
+    if (event.response_type != XCB_GE_GENERIC || !m_connection.Has().xinput)
+        return false;
+    return As<xcb_ge_generic_event_t>(event).extension == m_connection.Has().xinputOpcode;
 }
 
 } // namespace platform::x11

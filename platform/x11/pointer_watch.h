@@ -8,6 +8,7 @@
 #include <xcb/xcb.h>
 #include <xcb/xfixes.h>
 
+#include <cstdint>
 #include <memory>
 #include <optional>
 
@@ -16,7 +17,7 @@ namespace platform::x11 {
 /// Null when there is no image, or none that makes sense.
 std::shared_ptr<CursorImage> CursorFrom(const xcb_xfixes_get_cursor_image_reply_t* reply);
 
-/// The pointer and its image, by XFixes.
+/// The pointer and its image, by XFixes; and whether it has moved, by XInput.
 /// Threads: the X thread.
 /// Errors:  those of X11Connection.
 class PointerWatch {
@@ -34,12 +35,22 @@ public:
     std::shared_ptr<const CursorImage> Cursor() const { return m_cursor; }
     /// Where the pointer is in the root, in pixels: asks the server.
     std::optional<CGPoint> Position();
+    /// The same, and is told from then on when it moves, once: a mouse in motion isn't listened to.
+    std::optional<CGPoint> WatchedPosition();
+    /// Where it was at the last WatchedPosition, unless it has been moved since as far as is told; a client
+    /// that warps it isn't.
+    std::optional<CGPoint> PositionSoFar() const { return m_isWatched ? m_position : std::nullopt; }
 
 private:
+    bool IsMotion(const xcb_generic_event_t& event) const;
+    void SelectMotion(std::uint32_t kinds);
+
     X11Connection& m_connection;
     Memory& m_memory;
     std::shared_ptr<const CursorImage> m_cursor;
     bool m_changed = true;
+    bool m_isWatched = false; // it hasn't moved since that was asked to be told
+    std::optional<CGPoint> m_position;
 };
 
 } // namespace platform::x11

@@ -14,6 +14,7 @@
 #include <xcb/xc_misc.h>
 #include <xcb/xcbext.h>
 #include <xcb/xfixes.h>
+#include <xcb/xinput.h>
 
 #include <algorithm>
 #include <string>
@@ -169,8 +170,9 @@ void X11Connection::Introduce() {
 /// xcb looks an extension up when it is first used, and waits without end for the answer. So all of the
 /// answers are brought here first.
 void X11Connection::LookUpExtensions() {
-    xcb_extension_t* const all[] = {&xcb_composite_id, &xcb_damage_id, &xcb_shm_id, &xcb_randr_id,
-                                    &xcb_xfixes_id,    &xcb_shape_id,  &xcb_res_id, &xcb_xc_misc_id};
+    xcb_extension_t* const all[] = {&xcb_composite_id, &xcb_damage_id,  &xcb_shm_id,
+                                    &xcb_randr_id,     &xcb_xfixes_id,  &xcb_shape_id,
+                                    &xcb_res_id,       &xcb_xc_misc_id, &xcb_input_id};
     for (xcb_extension_t* const extension : all)
         xcb_prefetch_extension_data(Get(), extension);
     RoundTrip();
@@ -189,10 +191,12 @@ void X11Connection::LookUpExtensions() {
     m_extensions.xfixes = present(xcb_xfixes_id);
     m_extensions.shape = present(xcb_shape_id);
     m_extensions.xres = present(xcb_res_id);
+    m_extensions.xinput = present(xcb_input_id);
     m_extensions.damageEvent = m_extensions.damage ? find(xcb_damage_id)->first_event : std::uint8_t{0};
     m_extensions.randrEvent = m_extensions.randr ? find(xcb_randr_id)->first_event : std::uint8_t{0};
     m_extensions.xfixesEvent = m_extensions.xfixes ? find(xcb_xfixes_id)->first_event : std::uint8_t{0};
     m_extensions.shapeEvent = m_extensions.shape ? find(xcb_shape_id)->first_event : std::uint8_t{0};
+    m_extensions.xinputOpcode = m_extensions.xinput ? find(xcb_input_id)->major_opcode : std::uint8_t{0};
 }
 
 void X11Connection::LookUpVersions() {
@@ -203,6 +207,7 @@ void X11Connection::LookUpVersions() {
     Pending<xcb_xfixes_query_version_reply_t> xfixes;
     Pending<xcb_shape_query_version_reply_t> shape;
     Pending<xcb_res_query_version_reply_t> xres;
+    Pending<xcb_input_xi_query_version_reply_t> xinput;
     if (m_extensions.composite)
         composite = Ask<xcb_composite_query_version_reply_t>(xcb_composite_query_version(Get(), 0, 4));
     if (m_extensions.damage)
@@ -217,12 +222,15 @@ void X11Connection::LookUpVersions() {
         shape = Ask<xcb_shape_query_version_reply_t>(xcb_shape_query_version(Get()));
     if (m_extensions.xres)
         xres = Ask<xcb_res_query_version_reply_t>(xcb_res_query_version(Get(), 1, 2));
+    if (m_extensions.xinput)
+        xinput = Ask<xcb_input_xi_query_version_reply_t>(xcb_input_xi_query_version(Get(), 2, 2));
     m_extensions.composite = IsAtLeast(Await(composite), 0, 2);
     m_extensions.damage = IsAtLeast(Await(damage), 1, 1);
     m_extensions.shm = IsAtLeast(Await(shm), 1, 2);
     m_extensions.randr = IsAtLeast(Await(randr), 1, 5);
     m_extensions.xfixes = IsAtLeast(Await(xfixes), 2, 0);
     m_extensions.shape = IsAtLeast(Await(shape), 1, 1);
+    m_extensions.xinput = IsAtLeast(Await(xinput), 2, 2);
     const auto xresVersion = Await(xres); // names its fields differently
     m_extensions.xres =
         xresVersion != nullptr &&

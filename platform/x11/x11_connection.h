@@ -47,11 +47,13 @@ struct Extensions {
     bool randr = false; ///< With monitors (1.5).
     bool xfixes = false;
     bool shape = false;
-    bool xres = false; ///< With client ids (1.2).
+    bool xres = false;   ///< With client ids (1.2).
+    bool xinput = false; ///< With raw events whoever has grabbed the device, of touches too (2.2).
     std::uint8_t damageEvent = 0;
     std::uint8_t randrEvent = 0;
     std::uint8_t xfixesEvent = 0;
     std::uint8_t shapeEvent = 0;
+    std::uint8_t xinputOpcode = 0; ///< Its events are general ones, which tell it.
 };
 
 /// A request whose answer is not here yet. Dropped, it tells the connection to throw the answer away.

@@ -286,12 +286,31 @@ std::optional<CGPoint> X11Session::PointerPosition() {
     return InPoints(m_pointer.Position());
 }
 
-WindowPictureResult X11Session::TakeWindowPicture(const WindowPictureRequest& request) {
-    // What was painted before the question has been heard of then, and a server that doesn't answer gives no
-    // pictures, not even of what needn't be fetched.
+/// Whether what is known is all that there is to know: nothing has come since the server last answered, which
+/// isn't long ago, and a pointer that moves would be told.
+bool X11Session::IsQuiet() const {
+    return m_lastAnswered && m_events == m_eventsAnswered && m_pointer.PositionSoFar() &&
+           CmCurrentClock().RunsByItself() && CmSteadyNow() < *m_lastAnswered + QUIET_LIMIT;
+}
+
+/// What was painted before the question has been heard of then, and a server that doesn't answer gives no
+/// pictures, not even of what needn't be fetched.
+std::optional<CGPoint> X11Session::AskForPointer() {
+    const bool isTimed = CmCurrentClock().RunsByItself();
+    const Nanoseconds asked = CmSteadyNow();
+    m_eventsAnswered = m_events;
+    m_lastAnswered.reset();
     m_storages.AskAhead();
-    const std::optional<CGPoint> pointer = m_pointer.Position();
+    const std::optional<CGPoint> pointer = m_pointer.WatchedPosition();
+    if (isTimed)
+        m_lastAnswered = asked;
     CatchUp(EventsFrom::Answers);
+    return pointer;
+}
+
+WindowPictureResult X11Session::TakeWindowPicture(const WindowPictureRequest& request) {
+    CatchUp(EventsFrom::Socket);
+    const std::optional<CGPoint> pointer = IsQuiet() ? m_pointer.PositionSoFar() : AskForPointer();
     WindowPictureResult result =
         m_storages.Take(request, m_tree, InPoints(pointer), [this] { Drain(EventsFrom::Answers); });
     // Whoever has the picture finds the snapshot that it shows.

@@ -46,6 +46,9 @@ class X11Session {
 public:
     /// How long a compositor may lag behind the stack; measured, see docs/platforms.md.
     static constexpr std::chrono::nanoseconds COMPOSITOR_LAG = std::chrono::milliseconds(700);
+    /// For how long pictures are taken without a word to the server, as long as it has nothing to tell: a
+    /// server that stands still is found out so late, and so is a pointer that a client has warped.
+    static constexpr std::chrono::nanoseconds QUIET_LIMIT = std::chrono::milliseconds(200);
 
     X11Session(X11Connection& connection, Memory& memory, ApplicationWatch& applications,
                SessionListener& listener);
@@ -86,6 +89,8 @@ private:
     void UpdateApplications();
     void ReapApplications(std::chrono::nanoseconds now);
     std::optional<CGPoint> InPoints(const std::optional<CGPoint>& ofRoot) const;
+    bool IsQuiet() const;
+    std::optional<CGPoint> AskForPointer();
     std::uint64_t OldestShown();
     bool IsPainted(CGDirectDisplayID display);
 
@@ -101,6 +106,10 @@ private:
     bool m_composited = false;
     bool m_compositorUnknown = false; // another one may be there, or none
     std::uint64_t m_events = 0;
+    // When a picture was last begun with a question that the server has answered, and what had come by then.
+    // Nothing on a clock that is moved by hand.
+    std::optional<std::chrono::nanoseconds> m_lastAnswered;
+    std::uint64_t m_eventsAnswered = 0;
     bool m_unfinished = false; // more came than was taken in
     std::uint64_t m_treeRevision = 0;
     std::vector<ApplicationWindow> m_applicationWindows;

@@ -311,10 +311,11 @@ Borrowing X11Worker::RunForBorrower(Nanoseconds deadline, const X11Hub::Work& wo
     return borrowing;
 }
 
-/// Something is due before the thread wakes up, or it may have other things to wait on.
+/// Something is due before the thread wakes up, or it has other things to wait on.
 bool X11Worker::HasMoreToDo(std::uint64_t eventsBefore) const {
     const std::optional<Nanoseconds> due = m_session->NextDue();
-    return m_session->EventsSoFar() != eventsBefore || (due && *due < m_wakeTime);
+    return (due && *due < m_wakeTime) ||
+           (m_session->EventsSoFar() != eventsBefore && m_session->Descriptors() != m_waitedOn);
 }
 
 // ---- Sleeping
@@ -326,7 +327,8 @@ void X11Worker::Wait() {
     std::vector<pollfd> waits = ServerWaits(POLLIN);
     waits[0].fd = m_arrivals.Get();
     const auto ofSession = static_cast<std::ptrdiff_t>(waits.size());
-    for (const int descriptor : m_session->Descriptors())
+    m_waitedOn = m_session->Descriptors();
+    for (const int descriptor : m_waitedOn)
         waits.push_back({descriptor, POLLIN, 0});
     m_wakeTime = m_session->NextDue().value_or(Nanoseconds::max());
     m_hub.Lend(*this);

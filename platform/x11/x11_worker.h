@@ -85,6 +85,7 @@ private:
     Pending<xcb_get_input_focus_reply_t> m_question; // whether a stalled server answers
     bool m_asked = false;
     Nanoseconds m_wakeTime{0};    // until when it sleeps
+    std::vector<int> m_waitedOn;  // what of the session's it sleeps on
     std::exception_ptr m_failure; // of a borrower, for the thread to see to
     bool m_isReadable = false;    // the connection has something that nobody has read
     View m_view;

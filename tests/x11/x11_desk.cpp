@@ -2,6 +2,7 @@
 #include "tests/x11/x11_desk.h"
 
 #include <gtest/gtest.h>
+#include <xcb/xtest.h>
 
 #include <algorithm>
 #include <array>
@@ -269,7 +270,15 @@ bool X11Desk::ReserveTop(CGDirectDisplayID id, float points) {
 
 // ---- Pointer
 
+/// As a mouse does it.
 bool X11Desk::MovePointer(const CGPoint& position) {
+    xcb_test_fake_input(m_link->Get(), XCB_MOTION_NOTIFY, 0, XCB_CURRENT_TIME, m_link->Root(),
+                        static_cast<std::int16_t>(position.x), static_cast<std::int16_t>(position.y), 0);
+    m_link->RoundTrip();
+    return m_link->Works();
+}
+
+bool X11Desk::WarpPointer(const CGPoint& position) {
     xcb_warp_pointer(m_link->Get(), XCB_NONE, m_link->Root(), 0, 0, 0, 0,
                      static_cast<std::int16_t>(position.x), static_cast<std::int16_t>(position.y));
     m_link->RoundTrip();

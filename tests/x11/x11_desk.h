@@ -74,6 +74,8 @@ public:
     // ---- For tests of X11 alone
 
     XServer& Rig() { return m_rig; }
+    /// As a client does it: nobody is told.
+    bool WarpPointer(const platform::CGPoint& position);
     /// Null when there is none of that pid.
     X11Client* Application(pid_t pid);
     /// The one that AddWindow has made, as its application calls it.
