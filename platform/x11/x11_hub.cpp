@@ -142,24 +142,39 @@ PictureOutcome X11Hub::Run(Nanoseconds deadline, Work work) {
     Lock lock = m_state->point.Acquire();
     if (const std::optional<PictureOutcome> reason = WhyNot(lock, deadline))
         return *reason;
-    return RunThere(lock, command);
+    const std::uint64_t epoch = m_state->Epoch();
+    const PictureOutcome outcome = RunThere(lock, command);
+    AwaitTelling(lock, outcome, epoch, deadline);
+    return outcome;
 }
 
 PictureOutcome X11Hub::RunHereOrThere(Nanoseconds deadline, const Work& work) {
     if (InForkedChild())
         return PictureOutcome::Lost;
     ConnectionLender* lender = nullptr;
+    std::uint64_t epoch = 0;
     if (IsBrokenPipeBlocked()) {
         Lock lock = m_state->point.Acquire();
         if (const std::optional<PictureOutcome> reason = WhyNot(lock, deadline))
             return *reason;
         lender = m_state->Borrow(lock);
+        epoch = m_state->Epoch();
     }
     if (lender == nullptr)
         return Run(deadline, work);
     const Borrowing borrowing = lender->RunForBorrower(deadline, work);
     m_state->GiveBack(borrowing);
+    Lock lock = m_state->point.Acquire();
+    AwaitTelling(lock, borrowing.outcome, epoch, deadline);
     return borrowing.outcome;
+}
+
+/// Whoever hears that the server is lost and looks what has become of it isn't told that it is alive. The
+/// thread sees to that, and is at it.
+void X11Hub::AwaitTelling(Lock& lock, PictureOutcome outcome, std::uint64_t epoch, Nanoseconds deadline) {
+    while (outcome == PictureOutcome::Lost && m_state->IsAlive(lock) && m_state->Epoch() == epoch &&
+           CmSteadyNow() < deadline)
+        m_state->point.WaitUntil(lock, deadline);
 }
 
 PictureOutcome X11Hub::RunThere(Lock& lock, const CommandPtr& command) {

@@ -71,9 +71,10 @@ public:
     std::shared_ptr<const ApplicationList> Applications();
     std::shared_ptr<const CursorImage> Cursor();
 
-    /// Runs `work` on the thread and waits for it. Ok when it has run; Lost without a server that answers;
-    /// Timeout when the deadline has passed, which makes the server stalled unless it was passed before.
-    /// `work` may still run later, so it owns what it uses; and it may throw what X11Connection throws.
+    /// Runs `work` on the thread and waits for it. Ok when it has run; Lost without a server that answers,
+    /// and look-ups tell so by then; Timeout when the deadline has passed, which makes the server stalled
+    /// unless it was passed before. `work` may still run later, so it owns what it uses; and it may throw
+    /// what X11Connection throws.
     PictureOutcome Run(Nanoseconds deadline, Work work);
     /// The same, on the caller's own thread if the thread has nothing to do: no other one has to wake up
     /// then.
@@ -96,6 +97,8 @@ private:
     bool AwaitSettled(CCmWaitPoint::Lock& lock, Nanoseconds deadline);
     std::optional<PictureOutcome> WhyNot(CCmWaitPoint::Lock& lock, Nanoseconds deadline);
     PictureOutcome RunThere(CCmWaitPoint::Lock& lock, const std::shared_ptr<Command>& command);
+    void AwaitTelling(CCmWaitPoint::Lock& lock, PictureOutcome outcome, std::uint64_t epoch,
+                      Nanoseconds deadline);
     template <class Part>
     auto LookAt(Part part) -> decltype(part(std::declval<const View&>()));
     bool StartThread();

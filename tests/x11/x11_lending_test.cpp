@@ -155,6 +155,22 @@ TEST_F(X11Lending, EndsAtOnceWhenTheDisplayGoesOrTheServerRests) {
     EXPECT_TRUE(Becomes(Life::Alive));
 }
 
+TEST_F(X11Lending, HasToldOfALossByTheTimeTheBorrowerHearsOfIt) {
+    if (!Begin())
+        return;
+    const CBrokenPipeBlocked blocked;
+    for (int i = 0; i < 5; ++i) {
+        ASSERT_TRUE(Becomes(Life::Alive));
+        EXPECT_NE(TakeFor(PATIENCE), PictureOutcome::Lost);
+        Desk().Rig().Kill();
+        // There are no windows any more after the first time.
+        while (TakeFor(PATIENCE) != PictureOutcome::Lost)
+            std::this_thread::yield();
+        EXPECT_EQ(Server().GetLife().life, Life::Lost) << "round " << i;
+        Desk().Rig().Restart();
+    }
+}
+
 TEST_F(X11Lending, IsForOneAtATimeAmongManyAskers) {
     if (!Begin())
         return;
