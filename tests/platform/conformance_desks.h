@@ -76,7 +76,8 @@ public:
     std::optional<platform::CGDirectDisplayID> AddDisplay(const platform::CGSize& size) override {
         platform::SimulatedDisplay display;
         display.bounds.size = size;
-        for (const platform::DisplayInfo& each : *m_server->GetDisplays())
+        const auto displays = m_server->GetDisplays();
+        for (const platform::DisplayInfo& each : *displays)
             display.bounds.origin.x =
                 std::max(display.bounds.origin.x, each.bounds.origin.x + each.bounds.size.width);
         display.id = m_server->AddDisplay(display);

@@ -187,7 +187,8 @@ TEST_F(SimulatedWindowServers, RefuseAWindowIdThatWasUsed) {
 TEST_F(SimulatedWindowServers, StackWindowsWithinTheirLevelsUnlessToldOtherwise) {
     const auto order = [&] {
         std::vector<CGWindowID> ids;
-        for (const WindowInfo& window : m_server->GetWindows()->Windows())
+        const auto windows = m_server->GetWindows();
+        for (const WindowInfo& window : windows->Windows())
             ids.push_back(window.id);
         return ids;
     };

@@ -57,7 +57,8 @@ protected:
     PictureOutcome TakeFor(std::chrono::nanoseconds patience) {
         WindowPictureRequest request;
         request.rect = {{0, 0}, {4000, 4000}};
-        for (const WindowInfo& window : Server().GetWindows()->Windows())
+        const auto windows = Server().GetWindows();
+        for (const WindowInfo& window : windows->Windows())
             request.windows.push_back(window.id);
         request.deadline = CmSteadyNow() + patience;
         return Server().TakeWindowPicture(request).outcome;
@@ -98,7 +99,8 @@ TEST_F(X11Lending, KeepsTheViewTrue) {
         EXPECT_TRUE(ComesTrue([&] {
             EXPECT_EQ(TakeFor(PATIENCE), PictureOutcome::Ok);
             std::size_t ours = 0;
-            for (const WindowInfo& each : Server().GetWindows()->Windows())
+            const auto windows = Server().GetWindows();
+            for (const WindowInfo& each : windows->Windows())
                 ours += each.owner == Pid() && each.frame.size.width == 200 ? 1 : 0;
             return ours == expected;
         })) << i;

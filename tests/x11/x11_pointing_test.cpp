@@ -259,7 +259,8 @@ TEST_F(X11Pointing, IsToldWithThePicturesOfWindows) {
     const auto toldWithPicture = [&] {
         platform::WindowPictureRequest request;
         request.rect = {{0, 0}, {4000, 4000}};
-        for (const platform::WindowInfo& window : Desk().Server().GetWindows()->Windows())
+        const auto windows = Desk().Server().GetWindows();
+        for (const platform::WindowInfo& window : windows->Windows())
             request.windows.push_back(window.id);
         request.deadline = CmSteadyNow() + PATIENCE;
         const auto taken = Desk().Server().TakeWindowPicture(request);

@@ -77,7 +77,8 @@ TEST_P(ApplicationShare, BringsItsApplicationForward) {
     NEEDS(Open(secrets, TextFrame(), RED));
     EXPECT_EQ(Share(editor), 0);
     EXPECT_TRUE(RunUntil([&] {
-        for (const WindowInfo& window : m_desk->Server().GetWindows()->Windows()) {
+        const auto windows = m_desk->Server().GetWindows();
+        for (const WindowInfo& window : windows->Windows()) {
             if (window.owner == editor && window.id == text)
                 return true;
             if (window.owner == secrets && window.frame == TextFrame())
