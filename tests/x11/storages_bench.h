@@ -235,3 +235,7 @@ inline int CountOf(const platform::Picture& picture, std::uint32_t argb) {
     }
     return count;
 }
+
+inline bool IsAll(const platform::PicturePtr& picture, std::uint32_t argb) {
+    return picture != nullptr && CountOf(*picture, argb) == picture->width * picture->height;
+}

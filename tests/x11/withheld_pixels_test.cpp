@@ -24,10 +24,6 @@ constexpr int AREA = 200 * 100;
 const Look NONE{.background = std::nullopt};
 const Look SECRET{.background = 0xFF0000};
 
-bool IsAll(const PicturePtr& picture, std::uint32_t argb) {
-    return picture != nullptr && CountOf(*picture, argb) == picture->width * picture->height;
-}
-
 int RedOf(const PicturePtr& picture) {
     return picture != nullptr ? CountOf(*picture, RED) : 0;
 }
