@@ -12,6 +12,7 @@
 #include <pthread.h>
 
 #include <algorithm>
+#include <atomic>
 #include <utility>
 
 namespace platform {
@@ -62,6 +63,11 @@ int BeReadyForForks() {
 [[maybe_unused]] const int g_forkHandlers = BeReadyForForks();
 
 } // namespace
+
+std::uint64_t NewMoment() noexcept {
+    static std::atomic<std::uint64_t> last{0};
+    return ++last;
+}
 
 WindowSnapshot::WindowSnapshot(std::uint64_t generation, std::vector<WindowInfo> frontFirst)
     : m_generation(generation),

@@ -243,7 +243,11 @@ struct WindowPicture {
     std::uint64_t generation = 0; ///< The snapshot whose stack it shows.
     /// Where the pointer was then, in points, if the server has learnt it on the way.
     std::optional<CGPoint> pointer;
+    std::uint64_t moment = 0; ///< See WindowServer::GetMoment; 0 when it can't be told.
 };
+
+/// A number that no other moment of the process has, of whatever window server.
+std::uint64_t NewMoment() noexcept;
 
 enum class PictureOutcome {
     Ok,
@@ -409,6 +413,12 @@ public:
     virtual bool GetPointerPosition(CGPoint& position) const = 0;
     /// Null when there is no image. The same object as long as the serial is the same.
     virtual std::shared_ptr<const CursorImage> GetCursor() const = 0;
+
+    /// A name for all that the server tells just now: displays, windows, applications, the pointer and its
+    /// image, and what windows show. While it is that of a picture, the same request would get an equal picture
+    /// again, and every look-up what it got right behind that picture. 0 when only asking tells. Costs next to
+    /// nothing and never waits, so that a quiet desktop can be looked at often.
+    virtual std::uint64_t GetMoment() const { return 0; }
 
     // Pictures.
     /// One picture of the listed windows and of nothing else: never a pixel of a window that is not listed,

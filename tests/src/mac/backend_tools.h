@@ -1,6 +1,7 @@
 // SPDX-License-Identifier: Apache-2.0
 #pragma once
 
+#include "platform/platform_life.h"
 #include "platform/simulated/scene.h"
 #include "platform/window_server.h"
 #include "src/share_frame.h"
@@ -17,13 +18,17 @@
 
 /// What tests of back-ends say often.
 
-/// A simulated desktop in force for the length of a scope.
+/// A simulated desktop in force for the length of a scope. It ends once no thread of the platform is at work: a
+/// queued capture may outlive its back-end, and reads the clock and the settings of the test.
 class CServedScene {
 public:
     explicit CServedScene(const platform::Scene& scene)
         : m_server(scene.Serve()),
           m_former(platform::ReplaceWindowServer(m_server)) {}
-    ~CServedScene() { platform::ReplaceWindowServer(m_former); }
+    ~CServedScene() {
+        platform::Rest();
+        platform::ReplaceWindowServer(m_former);
+    }
     CServedScene(const CServedScene&) = delete;
     CServedScene& operator=(const CServedScene&) = delete;
 

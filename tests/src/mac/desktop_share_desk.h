@@ -1,6 +1,7 @@
 // SPDX-License-Identifier: Apache-2.0
 #pragma once
 
+#include "platform/platform_life.h"
 #include "platform/simulated/simulated_window_server.h"
 #include "platform/window_server.h"
 #include "tests/platform/conformance_desk.h"
@@ -68,7 +69,10 @@ public:
         : m_former(
               platform::ReplaceWindowServer(std::shared_ptr<platform::WindowServer>(desk, &desk->Server()))) {
     }
-    ~CServedDesk() { platform::ReplaceWindowServer(m_former); }
+    ~CServedDesk() {
+        platform::Rest();
+        platform::ReplaceWindowServer(m_former);
+    }
     CServedDesk(const CServedDesk&) = delete;
     CServedDesk& operator=(const CServedDesk&) = delete;
 
