@@ -67,7 +67,7 @@ int PixelsAcross(double points, float scale) {
 CGWindowImageRef MakeImage(const WindowPicture& picture, const CGRect& rect,
                            std::span<const CGWindowID> windows) {
     const PointEdges edges(rect);
-    CGWindowImage image{edges, 0, 0, SeenLayers(picture, edges, windows), picture.pointer};
+    CGWindowImage image{edges, 0, 0, SeenLayers(picture, edges, windows), picture.pointer, picture.moment};
     float scale = image.layers.empty() ? 1.0F : 0.0F;
     for (const WindowLayer& layer : image.layers)
         scale = std::max(scale, layer.picture->scale);
@@ -147,6 +147,14 @@ int CGWindowImageGetHeight(const CGWindowImage* image) noexcept {
 
 std::optional<CGPoint> CGWindowImageGetPointer(const CGWindowImage* image) noexcept {
     return image != nullptr ? image->pointer : std::nullopt;
+}
+
+std::uint64_t CGWindowImageGetMoment(const CGWindowImage* image) noexcept {
+    return image != nullptr ? image->moment : 0;
+}
+
+std::uint64_t CGWindowServerGetMoment() noexcept {
+    return WindowServerInUse()->GetMoment();
 }
 
 bool CGWindowImageIsOpaque(const CGWindowImage* image) noexcept {

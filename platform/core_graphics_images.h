@@ -5,6 +5,7 @@
 #include "platform/cg_image.h"
 #include "platform/core_types.h"
 
+#include <cstdint>
 #include <memory>
 #include <optional>
 #include <span>
@@ -39,6 +40,12 @@ int CGWindowImageGetHeight(const CGWindowImage* image) noexcept;
 /// Where the pointer was when it was taken, in global points, if the window server has told; nothing for
 /// null.
 std::optional<CGPoint> CGWindowImageGetPointer(const CGWindowImage* image) noexcept;
+
+/// The window server's moment when it was taken: while CGWindowServerGetMoment gives the same, it would be
+/// taken again as it is (WindowServer::GetMoment). 0 when that can't be told, and for null.
+std::uint64_t CGWindowImageGetMoment(const CGWindowImage* image) noexcept;
+/// Costs next to nothing and never waits. 0 when only asking tells.
+std::uint64_t CGWindowServerGetMoment() noexcept;
 
 /// Whether drawing it leaves nothing of what was there before. False for null.
 bool CGWindowImageIsOpaque(const CGWindowImage* image) noexcept;

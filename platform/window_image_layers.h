@@ -50,6 +50,7 @@ struct CGWindowImage {
     int height = 0;
     std::vector<WindowLayer> layers; // back to front, none of them wholly outside or hidden by a single other
     std::optional<CGPoint> pointer;
+    std::uint64_t moment = 0;
 };
 
 /// Where a layer goes when all of the image goes to `target`: whole pixels of a bitmap context.

@@ -415,9 +415,9 @@ public:
     virtual std::shared_ptr<const CursorImage> GetCursor() const = 0;
 
     /// A name for all that the server tells just now: displays, windows, applications, the pointer and its
-    /// image, and what windows show. While it is that of a picture, the same request would get an equal picture
-    /// again, and every look-up what it got right behind that picture. 0 when only asking tells. Costs next to
-    /// nothing and never waits, so that a quiet desktop can be looked at often.
+    /// image, and what windows show. While it is that of a picture, the same request would get an equal
+    /// picture again, and every look-up what it got right behind that picture. 0 when only asking tells.
+    /// Costs next to nothing and never waits, so that a quiet desktop can be looked at often.
     virtual std::uint64_t GetMoment() const { return 0; }
 
     // Pictures.

@@ -96,6 +96,11 @@ CGSMoment CGSPinnedMoment() noexcept {
     return {PinnedWindows(), WindowServerInUse()->GetDisplays()};
 }
 
+CGSMoment CGSCurrentMoment() noexcept {
+    const std::shared_ptr<WindowServer> server = WindowServerInUse();
+    return {server->GetWindows(), server->GetDisplays()};
+}
+
 CGError CGSGetWindowLevel(CGSConnectionID connection, CGWindowID window, int* level) noexcept {
     return LookUp(connection, window, level, [level](const WindowInfo& info) {
         *level = info.level;

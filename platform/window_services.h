@@ -55,6 +55,8 @@ struct CGSMoment {
 };
 
 CGSMoment CGSPinnedMoment() noexcept;
+/// What a thread that pins now would get.
+CGSMoment CGSCurrentMoment() noexcept;
 
 CGError CGSGetWindowLevel(CGSConnectionID connection, CGWindowID window, int* level) noexcept;
 

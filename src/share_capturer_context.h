@@ -30,6 +30,9 @@ public:
 
     /// Walks the window list and publishes what it shows. -3 here: there is no list to walk.
     virtual int UpdateShareCapturerContext();
+    /// Whether a walk would find now what the last one did; false when that can't be told. On the thread of
+    /// the walk.
+    virtual bool DoesLastWalkStand() const { return false; }
     virtual bool shouldPauseCapturing();
     /// Makes the tables of the shared displays anew. Called with or without m_displayLock, which is
     /// recursive.

@@ -2,6 +2,7 @@
 #include "src/share_frame.h"
 
 #include <algorithm>
+#include <atomic>
 #include <cstddef>
 #include <cstring>
 #include <utility>
@@ -264,7 +265,8 @@ bool CShareFrame::HasSameData(CShareFrame& other) {
     if (_GetFrameDataLen() != other._GetFrameDataLen() || len != other._GetBackedDataLen()) {
         return false;
     }
-    if (m_pNote != nullptr && other.m_pNote != nullptr && m_pNote->IsSameAs(*other.m_pNote)) {
+    if (m_pNote != nullptr && other.m_pNote != nullptr &&
+        ((NoteNumber() != 0 && NoteNumber() == other.NoteNumber()) || m_pNote->IsSameAs(*other.m_pNote))) {
         return true;
     }
     const unsigned char* const data = _BufferInForce();
@@ -297,6 +299,11 @@ void CShareFrame::_SwapFields(CShareFrame& other) {
 }
 
 // ---- The note
+
+std::uint64_t ShareFrameNote::NewNumber() noexcept {
+    static std::atomic<std::uint64_t> last{0};
+    return ++last;
+}
 
 /// It goes with the pixels, unless they go where somebody else may write to them.
 void CShareFrame::_SwapNotes(CShareFrame& other) {

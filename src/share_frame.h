@@ -80,6 +80,10 @@ public:
     void AllowNote() { m_bAllowsNote = true; }
     bool AllowsNote() const { return m_bAllowsNote && m_pExternalBuf == nullptr; }
     bool HasNote() const { return m_pNote != nullptr; }
+    /// 0 without a note, or one without a number.
+    std::uint64_t NoteNumber() const { return m_pNote != nullptr ? m_pNote->Number() : 0; }
+    /// Whoever fills the frame leaves its pixels, and so its note, as they are.
+    void ConfirmNote() { m_bNoteIsOfThisFilling = true; }
     /// Null when nothing is known of the pixels. The frame has none any more.
     std::unique_ptr<ShareFrameNote> TakeNote();
     /// To be called when all pixels are as `note` says. Given up by a frame that doesn't keep any.

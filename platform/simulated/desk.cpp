@@ -49,6 +49,7 @@ void Desk::Change(const std::function<void(SimulatedDesktop&)>& change) {
         return;
     const Lock lock = m_point.Acquire();
     std::vector<SimulatedWindow> before = m_desktop.windows;
+    m_moment = NewMoment(); // first: a change that throws may have done a part
     change(m_desktop);
     Mend(m_desktop);
     for (SimulatedWindow& window : m_desktop.windows) {
@@ -134,10 +135,18 @@ void Desk::SetPictureLag(Nanoseconds lag) {
     m_lag = lag;
 }
 
+void Desk::TellMoments(bool tells) {
+    if (InForkedChild())
+        return;
+    const Lock lock = m_point.Acquire();
+    m_tellsMoments = tells;
+}
+
 void Desk::SetLie(SimulatedLie lie, bool tells) {
     if (InForkedChild())
         return;
     const Lock lock = m_point.Acquire();
+    m_moment = NewMoment();
     if (tells)
         m_lies.insert(lie);
     else
@@ -202,6 +211,7 @@ void Desk::SetLifeNow(Life life) {
 
 /// After every change: tells what is to be told and wakes who waits for it.
 void Desk::Settle() {
+    m_moment = NewMoment();
     // A server that doesn't answer tells of nothing either.
     if (m_life.life != Life::Stalled && !m_closed) {
         PublishDisplays();

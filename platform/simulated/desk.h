@@ -101,6 +101,7 @@ public:
     void SetPictureLag(Nanoseconds lag);
     void SetLie(SimulatedLie lie, bool tells);
     OperationScript& Script() { return m_script; }
+    void TellMoments(bool tells);
 
     // ---- The server's side
 
@@ -120,6 +121,7 @@ public:
     std::shared_ptr<const WindowSnapshot> GetWindows(const Lock&) const { return m_windows; }
     std::shared_ptr<const ApplicationList> GetApplications(const Lock&) const { return m_applications; }
     std::optional<CGPoint> GetPointer(const Lock&) const;
+    std::uint64_t GetMoment() const;
     std::shared_ptr<const CursorImage> GetCursor(const Lock&) const;
     WindowPictureResult TakeWindowPicture(const WindowPictureRequest& request, const Lock&);
     bool BringToFront(pid_t pid, const Lock&);
@@ -181,6 +183,7 @@ private:
     std::vector<CGWindowID> Existing(const std::vector<CGWindowID>& windows) const;
     CGWindowID FrontUnlisted(const std::vector<CGWindowID>& windows) const;
     std::uint64_t OldestGenerationShown() const;
+    std::uint64_t MomentNow() const;
 
     // Streams.
     bool IsListed(CGDirectDisplayID display) const;
@@ -203,7 +206,7 @@ private:
     OperationScript m_script;
     std::atomic<std::uint64_t> m_epoch{1};
 
-    CCmWaitPoint m_point;
+    mutable CCmWaitPoint m_point;
     // Guarded by the point's mutex.
     SimulatedDesktop m_desktop;
     std::set<CGWindowID> m_usedIds;
@@ -233,7 +236,9 @@ private:
     std::vector<std::pair<Nanoseconds, std::uint64_t>> m_generations; // since when, oldest first
     // Pictures.
     DesktopPainter m_painter;
-    std::uint64_t m_looks = 0;                                  // grows when something may look different
+    std::uint64_t m_looks = 0;            // grows when something may look different
+    std::uint64_t m_moment = NewMoment(); // another one with each change
+    bool m_tellsMoments = false;
     std::map<std::pair<CGDirectDisplayID, bool>, Looks> m_seen; // by display and pointer
     std::list<std::shared_ptr<Reader>> m_readers;
     std::uint64_t m_lastReader = 0;

@@ -34,6 +34,7 @@ WindowPictureResult Desk::TakeWindowPicture(const WindowPictureRequest& request,
                                                        : DisplayLayers(windows, request.rect);
     picture->time = CmSteadyNow();
     picture->generation = m_generation;
+    picture->moment = MomentNow();
     return {PictureOutcome::Ok, std::move(picture)};
 }
 
@@ -105,6 +106,20 @@ std::vector<PictureLayer> Desk::DisplayLayers(const std::vector<CGWindowID>& win
         }
     }
     return layers;
+}
+
+/// 0 while something moves by itself, or the next calls are not to be as those before.
+std::uint64_t Desk::MomentNow() const {
+    const bool stands = m_tellsMoments && m_life.life == Life::Alive && !m_stallEnds &&
+                        !m_script.HasPlans() && !NextMotion(CmSteadyNow() - m_beginning);
+    return stands ? m_moment : 0;
+}
+
+std::uint64_t Desk::GetMoment() const {
+    if (InForkedChild())
+        return 0;
+    const Lock lock = m_point.Acquire();
+    return MomentNow();
 }
 
 /// Where pictures lag behind, they may still show the stack of a while ago.

@@ -57,6 +57,11 @@ OperationScript::Count OperationScript::CallsOf(SimulatedOperation operation) co
     return m_plans[static_cast<std::size_t>(operation)].calls;
 }
 
+bool OperationScript::HasPlans() const {
+    const std::lock_guard<std::mutex> lock(m_mutex);
+    return std::any_of(m_plans.begin(), m_plans.end(), [](const Plan& plan) { return !plan.rules.empty(); });
+}
+
 void OperationScript::Add(SimulatedOperation operation, Count nth, Count count, Fate fate) {
     const std::lock_guard<std::mutex> lock(m_mutex);
     Plan& plan = PlanOf(operation);

@@ -58,6 +58,8 @@ public:
     void Heal(SimulatedOperation operation);
 
     Count CallsOf(SimulatedOperation operation) const;
+    /// Whether anything is to happen to calls to come.
+    bool HasPlans() const;
 
 private:
     struct Rule {

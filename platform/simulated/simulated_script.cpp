@@ -252,6 +252,10 @@ void SimulatedWindowServer::SetPointerModes(bool without, bool with) {
     m_desk->SetPointerModes(without, with);
 }
 
+void SimulatedWindowServer::TellMoments(bool tells) {
+    m_desk->TellMoments(tells);
+}
+
 void SimulatedWindowServer::SetPictureLag(std::chrono::nanoseconds lag) {
     m_desk->SetPictureLag(lag);
 }

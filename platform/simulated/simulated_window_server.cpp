@@ -98,6 +98,10 @@ std::shared_ptr<const CursorImage> SimulatedWindowServer::GetCursor() const {
     return entry.Fails() ? nullptr : m_desk->GetCursor(entry.lock);
 }
 
+std::uint64_t SimulatedWindowServer::GetMoment() const {
+    return m_desk->GetMoment();
+}
+
 // Exceptions leave the lock behind before they are traced.
 
 WindowPictureResult SimulatedWindowServer::TakeWindowPicture(const WindowPictureRequest& request) {

@@ -103,6 +103,9 @@ public:
     void SetCapability(Capability capability, Availability availability);
     /// Which streams there are.
     void SetPointerModes(bool without, bool with);
+    /// Whether it tells moments; at first it doesn't, so that every capture makes the calls that a script
+    /// counts.
+    void TellMoments(bool tells);
     /// For so long, pictures of displays may still show the stack before a change.
     void SetPictureLag(std::chrono::nanoseconds lag);
 
@@ -155,6 +158,8 @@ public:
     std::shared_ptr<const ApplicationList> GetApplications() const override;
     bool GetPointerPosition(CGPoint& position) const override;
     std::shared_ptr<const CursorImage> GetCursor() const override;
+    /// No operation that a script can count or have fail.
+    std::uint64_t GetMoment() const override;
     WindowPictureResult TakeWindowPicture(const WindowPictureRequest& request) override;
     DisplayStreamResult OpenDisplayStream(const DisplayStreamRequest& request) override;
     void Rest() override;

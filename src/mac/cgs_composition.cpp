@@ -148,6 +148,7 @@ int CShareCGSCapturer::capture(IShareFrame* frame, unsigned display, TVLSize bit
     if (frame == nullptr)
         return SHARE_CAPTURE_FAILED;
     m_bPointerCaptured = false;
+    m_nDrawnMoment = 0;
     if (display != m_nCapturedDisplayId) {
         m_nCapturedDisplayId = display;
         m_fDisplayScale = CMonitorEnumMac::screenScaleFactorForDisplayID(display);
@@ -176,6 +177,7 @@ int CShareCGSCapturer::capture(IShareFrame* frame, unsigned display, TVLSize bit
     Show(pass, own, before.get());
     if (m_note == nullptr)
         m_note = std::move(before);
+    m_nDrawnMoment = platform::CGWindowImageGetMoment(pass.image.get());
     frame->SetMetaInfo({ShareUtilMac::CGRectToTVLRect(pass.drawRect), m_bPointerCaptured});
     return SHARE_CAPTURE_OK;
 }
@@ -269,10 +271,25 @@ bool CShareCGSCapturer::Describe(const Pass& pass) noexcept {
         ShareComposition composition{pass.bitmap, std::nullopt, pass.place, pass.image.get(), pass.pointer};
         if (!pass.CoversClip(m_bmpContext.get()))
             composition.background = pass.background;
-        return m_note->Describe(m_bmpContext.get(), composition);
+        if (!m_note->Describe(m_bmpContext.get(), composition))
+            return false;
+        Number();
+        return true;
     } catch (const std::bad_alloc&) {
         return false;
     }
+}
+
+/// Frames take turns, so that the one before last may show the same.
+void CShareCGSCapturer::Number() {
+    if (m_lastDescribed == nullptr)
+        m_lastDescribed = std::make_unique<ShareCompositionNote>();
+    if (m_lastDescribed->Number() == 0 || !m_note->IsSameAs(*m_lastDescribed)) {
+        m_lastDescribed->SetNumber(0); // until it is whole
+        m_note->SetNumber(ShareFrameNote::NewNumber());
+        *m_lastDescribed = *m_note;
+    }
+    m_note->SetNumber(m_lastDescribed->Number());
 }
 
 /// False when all has to be drawn.

@@ -8,6 +8,7 @@
 
 #include <screenshare/share_types.h>
 
+#include <cstdint>
 #include <memory>
 #include <span>
 #include <vector>
@@ -77,6 +78,9 @@ public:
 
     /// Of the last pass: the pointer is in the picture, or need not be.
     bool PointerCaptured() const { return m_bPointerCaptured; }
+    /// Of the last pass: the window server's moment of what was drawn, 0 when none is known
+    /// (platform::CGWindowImageGetMoment).
+    std::uint64_t DrawnMoment() const { return m_nDrawnMoment; }
 
 private:
     /// What a pass has found out so far.
@@ -92,6 +96,7 @@ private:
     /// Makes the frame show what the pass has found.
     void Show(const Pass& pass, CShareFrame* frame, const ShareCompositionNote* before);
     bool Describe(const Pass& pass) noexcept;
+    void Number();
     bool DrawChanges(const Pass& pass, const ShareCompositionNote& before);
     bool DrawPart(const Pass& pass, const platform::PixelRegion& part);
     bool DrawAll(const Pass& pass);
@@ -110,5 +115,7 @@ private:
     platform::CGRect m_rectLastCapture;
     /// Of this pass while it lasts, then any that can be written over.
     std::unique_ptr<ShareCompositionNote> m_note;
+    std::unique_ptr<ShareCompositionNote> m_lastDescribed; // has a number
+    std::uint64_t m_nDrawnMoment = 0;
     bool m_bPointerCaptured = false;
 };

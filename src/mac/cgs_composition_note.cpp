@@ -17,6 +17,7 @@ bool ShareCompositionNote::IsSameAs(const ShareFrameNote& other) const {
 }
 
 bool ShareCompositionNote::Describe(const platform::CGContext* context, const ShareComposition& composition) {
+    SetNumber(0);
     m_size = composition.size;
     m_background = composition.background;
     m_pointer = {};

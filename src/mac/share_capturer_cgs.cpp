@@ -137,16 +137,15 @@ bool ShareCapturerCGS::IsDraging() {
     return shareUtilMacMonitorDraging.IsDraging(update);
 }
 
+ShareCapturerCGS::Target ShareCapturerCGS::CurrentTarget() {
+    const std::lock_guard<std::mutex> lock(m_captureMutex);
+    return {m_nCapturedDisplayId, m_sizeBmpContext, m_sizeCaptureContext, m_szMaxCapture};
+}
+
 int ShareCapturerCGS::CaptureWith(CShareCGSCapturer& composition, IShareFrame& frame) {
-    TVLSize bitmap{};
-    TVLSize capture{};
-    {
-        const std::lock_guard<std::mutex> lock(m_captureMutex);
-        bitmap = m_sizeBmpContext;
-        capture = m_sizeCaptureContext;
-        composition.setMaxSize(m_szMaxCapture);
-    }
-    const int result = composition.capture(&frame, m_nCapturedDisplayId, bitmap, capture);
+    const Target target = CurrentTarget();
+    composition.setMaxSize(target.max);
+    const int result = composition.capture(&frame, target.display, target.bitmap, target.capture);
     frame.SetTimestamp(ShareUtil::GetCaptureFrameTimeStamp());
     return result;
 }

@@ -54,6 +54,16 @@ protected:
     bool IsOfWindows() const;
     /// Walks the windows, unless they have moved just now. On the capture thread.
     bool IsDraging();
+    /// What is captured, and how large.
+    struct Target {
+        unsigned display = 0;
+        TVLSize bitmap{};
+        TVLSize capture{};
+        TVLSize max{};
+
+        bool operator==(const Target&) const = default;
+    };
+    Target CurrentTarget();
     /// One picture as `composition` makes it; its code. The frame is stamped whatever becomes of it.
     int CaptureWith(CShareCGSCapturer& composition, IShareFrame& frame);
 

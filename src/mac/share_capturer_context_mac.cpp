@@ -121,6 +121,14 @@ int ShareCapturerContextMac::UpdateShareCapturerContext() {
     return SHARE_RESULT_FAILED;
 }
 
+bool ShareCapturerContextMac::DoesLastWalkStand() const {
+    if (!m_lastWalk)
+        return false;
+    WalkInputs inputs = _ReadInputs();
+    inputs.moment = platform::CGSCurrentMoment();
+    return _LastWalkStands(inputs);
+}
+
 ShareCapturerContextMac::WalkInputs ShareCapturerContextMac::_ReadInputs() const {
     WalkInputs inputs;
     inputs.revision =

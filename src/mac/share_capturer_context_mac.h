@@ -28,6 +28,7 @@ public:
     /// -1 when it has walked, or the last walk stands; 0 when SHARE_CONFIG_FLAG_NO_WINDOW_WALK keeps it from
     /// walking, and all stays as it was.
     int UpdateShareCapturerContext() override;
+    bool DoesLastWalkStand() const override;
 
     /// Always 0. The scale of the last shared display becomes that of the process.
     int InitDisplays() override;

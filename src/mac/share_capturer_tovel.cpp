@@ -7,6 +7,8 @@
 
 #include <screenshare/share_capturer.h>
 
+#include <cstdint>
+
 ShareCapturerTovel::~ShareCapturerTovel() {
     CmTraceDebug("[ShareCapturerTovel::dealloc]");
 }
@@ -25,14 +27,37 @@ unsigned ShareCapturerTovel::captureToIShareFrame(IShareFrame* frame) {
         return static_cast<unsigned>(SHARE_CAPTURE_FAILED);
     int result = SHARE_CAPTURE_FAILED;
     CmCallGuarded("[ShareCapturerTovel::captureToIShareFrame]>>fail>>", [&] {
-        if (IsDraging()) {
-            result = SHARE_CAPTURE_DRAGGING;
-            return;
-        }
-        const std::lock_guard<std::mutex> lock(m_bmpContextLock);
-        result = CaptureWith(*m_cgsCapturer, *frame);
+        const std::optional<ShareStandingPicture::Terms> terms = TermsInForce();
+        const bool isThere = terms && m_standing.IsIn(*frame, *terms);
+        result = isThere ? SHARE_CAPTURE_OK : CaptureAnew(*frame);
     });
     return static_cast<unsigned>(result);
+}
+
+int ShareCapturerTovel::CaptureAnew(IShareFrame& frame) {
+    m_standing.Forget();
+    if (IsDraging())
+        return SHARE_CAPTURE_DRAGGING;
+    const std::lock_guard<std::mutex> lock(m_bmpContextLock);
+    const std::optional<ShareStandingPicture::Terms> terms = TermsInForce();
+    const int result = CaptureWith(*m_cgsCapturer, frame);
+    const std::uint64_t moment = m_cgsCapturer->DrawnMoment();
+    // What the walk went by, before the windows' picture was taken, must be true still.
+    if (result == SHARE_CAPTURE_OK && moment != 0 && terms && Context()->DoesLastWalkStand())
+        m_standing.Keep(frame, *terms, moment);
+    return result;
+}
+
+std::optional<ShareStandingPicture::Terms> ShareCapturerTovel::TermsInForce() {
+    if (Context() == nullptr)
+        return std::nullopt;
+    std::optional<ShareStandingPicture::Terms> terms = ShareStandingPicture::TermsOf(*Context());
+    if (!terms)
+        return std::nullopt;
+    const Target target = CurrentTarget();
+    terms->display = target.display;
+    terms->sizes = {target.bitmap, target.capture, target.max};
+    return terms;
 }
 
 unsigned char ShareCapturerTovel::pointerCaptured() {

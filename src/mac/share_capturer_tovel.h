@@ -2,12 +2,14 @@
 #pragma once
 
 #include "src/mac/share_capturer_cgs.h"
+#include "src/mac/share_standing_picture.h"
 
 #include <memory>
 #include <mutex>
+#include <optional>
 
 /// The default back-end, which every other one falls back to: each picture is made inside the capture that
-/// asks for it, of window images.
+/// asks for it, of window images. What a frame shows already is not made again while nothing has changed.
 /// Threads: those of the protocol.
 class ShareCapturerTovel : public ShareCapturerCGS {
 public:
@@ -21,7 +23,12 @@ public:
     unsigned char pointerCaptured() override;
 
 private:
+    /// Nothing while each capture has to be made.
+    std::optional<ShareStandingPicture::Terms> TermsInForce();
+    int CaptureAnew(IShareFrame& frame);
+
     std::mutex m_bmpContextLock; // held throughout a picture
-    unsigned m_nRgbValue = 0;    // the background when it was made; passes look at the one in force
+    ShareStandingPicture m_standing;
+    unsigned m_nRgbValue = 0; // the background when it was made; passes look at the one in force
     std::unique_ptr<CShareCGSCapturer> m_cgsCapturer;
 };

@@ -51,6 +51,7 @@ DeliveredHistory::DeliveredHistory(const DeliveredKind& kind, DeliveredFault fau
     : m_kind(kind),
       m_fault(fault),
       m_random(seed),
+      m_tellsMoments(seed % 2 == 0),
       m_server(dynamic_cast<platform::SimulatedWindowServer*>(&m_desk.Desk().Server())),
       m_paced(std::make_shared<CPacedWindowServer>(ServerOfSessions())) {
     Prepare();
@@ -65,6 +66,7 @@ DeliveredHistory::~DeliveredHistory() {
 void DeliveredHistory::Prepare() {
     ConformanceDesk& desk = m_desk.Desk();
     LieAsTheFaultHasIt(m_fault, *m_server);
+    m_server->TellMoments(m_tellsMoments);
     if (!m_kind.IsOfSession())
         m_script->Fail(platform::AVCaptureOperation::SessionInit, 1, platform::AVCaptureScript::ALL);
     else if (Chance(40))

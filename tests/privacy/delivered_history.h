@@ -164,6 +164,7 @@ private:
     const DeliveredKind m_kind;
     const DeliveredFault m_fault;
     std::mt19937 m_random;
+    const bool m_tellsMoments; // captures may then be left out while nothing changes
     CSettingsScope m_settings;
     SimulatedShareDesk m_desk;
     platform::SimulatedWindowServer* const m_server;

@@ -18,8 +18,8 @@
 
 /// What tests of back-ends say often.
 
-/// A simulated desktop in force for the length of a scope. It ends once no thread of the platform is at work: a
-/// queued capture may outlive its back-end, and reads the clock and the settings of the test.
+/// A simulated desktop in force for the length of a scope. It ends once no thread of the platform is at work:
+/// a queued capture may outlive its back-end, and reads the clock and the settings of the test.
 class CServedScene {
 public:
     explicit CServedScene(const platform::Scene& scene)

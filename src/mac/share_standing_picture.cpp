@@ -1,0 +1,52 @@
+// SPDX-License-Identifier: Apache-2.0
+#include "src/mac/share_standing_picture.h"
+
+#include "platform/core_graphics_images.h"
+#include "src/app_share_config.h"
+#include "src/share_capturer_context.h"
+#include "src/share_frame.h"
+#include "src/share_util.h"
+#include "util/cm_trace.h"
+
+std::optional<ShareStandingPicture::Terms> ShareStandingPicture::TermsOf(
+    const ShareCapturerContext& context) {
+    const AppShareConfig& config = *AppShareConfig::Instance();
+    constexpr unsigned EACH_TIME = SHARE_CONFIG_FLAG_PERFORMANCE_TRACE | SHARE_CONFIG_FLAG_NO_WINDOW_WALK;
+    Terms terms;
+    terms.revision = context.Revision(); // first: what is read behind it may be newer
+    terms.flags = config.m_nShareConfigFlags;
+    if ((terms.flags & EACH_TIME) != 0 || CmTraceOn(CM_TRACE_DEBUG))
+        return std::nullopt;
+    terms.publications = context.Publications();
+    terms.isWindowArea = !context.m_bNoWindowBaseArea;
+    terms.excludesMenuBars = context.m_bExcludeMenuBar;
+    terms.findsExposed = context.m_bFindsExposed;
+    terms.scale = config.m_fCurrentScale;
+    terms.isAppDisplayByWindow = config.m_bAppDisplayByWindow;
+    terms.isResampled = config.m_bCaptureResampleEnable;
+    terms.isSizeFixed = config.m_bCaptureResampleFixSizeEnable;
+    terms.fixedSize = {config.m_nResampleScreenCaptureWidth, config.m_nResampleScreenCaptureHeight};
+    terms.background = config.m_nAppShareBackgroundColor;
+    return terms;
+}
+
+bool ShareStandingPicture::IsIn(IShareFrame& frame, const Terms& terms) const {
+    if (m_nMoment == 0 || terms != m_terms)
+        return false;
+    auto* const own = dynamic_cast<CShareFrame*>(&frame);
+    if (own == nullptr || !own->AllowsNote() || own->NoteNumber() != m_nNote ||
+        platform::CGWindowServerGetMoment() != m_nMoment)
+        return false;
+    own->ConfirmNote();
+    own->SetMetaInfo(m_meta);
+    own->SetTimestamp(ShareUtil::GetCaptureFrameTimeStamp());
+    return true;
+}
+
+void ShareStandingPicture::Keep(IShareFrame& frame, const Terms& terms, std::uint64_t moment) {
+    const auto* const own = dynamic_cast<const CShareFrame*>(&frame);
+    m_nNote = own != nullptr ? own->NoteNumber() : 0;
+    m_nMoment = m_nNote != 0 ? moment : 0;
+    m_terms = terms;
+    m_meta = frame.GetMetaInfo();
+}

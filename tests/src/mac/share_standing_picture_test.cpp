@@ -1,0 +1,348 @@
+// SPDX-License-Identifier: Apache-2.0
+#include "src/mac/cgs_composition.h"
+#include "src/mac/share_capturer_context_mac.h"
+#include "src/mac/share_capturer_tovel.h"
+#include "src/share_util.h"
+#include "tests/src/mac/backend_tools.h"
+#include "tests/src/mac/painted_desk.h"
+#include "tests/support/engine_bench.h"
+#include "tests/support/test_effort.h"
+#include "tests/support/threads.h"
+
+#include <screenshare/share_capturer.h>
+
+#include <gtest/gtest.h>
+
+#include <array>
+#include <chrono>
+#include <cstddef>
+#include <cstdint>
+#include <cstring>
+#include <iostream>
+#include <memory>
+#include <ostream>
+#include <string>
+
+// What captures leave undone on a desktop at rest, if its window server tells that it is.
+
+using namespace platform;
+using namespace painted_desk;
+
+namespace {
+
+using ms = std::chrono::milliseconds;
+
+constexpr CGWindowID WINDOW = 2;
+
+/// A default back-end, and two frames that take turns.
+struct CStandingBench {
+    CStandingBench() {
+        desktop->AddWindow(EditorsWindow());
+        desktop->TellMoments(true);
+        EXPECT_TRUE(backEnd.init(context));
+        context->AddSharedDisplay(MAIN);
+        for (ShareRef<CShareFrame>& each : frames) {
+            each = ShareRef<CShareFrame>(new CShareFrame);
+            each.Get()->AllowNote(); // as an engine's
+        }
+    }
+
+    static SimulatedWindow EditorsWindow() {
+        SimulatedWindow window;
+        window.info.id = WINDOW;
+        window.info.owner = EDITOR;
+        window.info.frame = {{10, 10}, {50, 40}};
+        window.content = SimulatedContent::Colour(0x00FF00);
+        return window;
+    }
+
+    CShareFrame& Frame(std::size_t which = 0) { return *frames[which].Get(); }
+    unsigned Capture(std::size_t which = 0) {
+        Frame(which).BeginFilling();
+        const unsigned result = backEnd.captureToIShareFrame(&Frame(which));
+        Frame(which).EndFilling();
+        return result;
+    }
+    unsigned Questions() const {
+        return desktop->CallsOf(SimulatedOperation::GetWindows) +
+               desktop->CallsOf(SimulatedOperation::GetDisplays) +
+               desktop->CallsOf(SimulatedOperation::TakeWindowPicture) +
+               desktop->CallsOf(SimulatedOperation::GetPointerPosition);
+    }
+    /// Whether a capture asks the desktop for anything.
+    bool Asks(std::size_t which = 0) {
+        const unsigned before = Questions();
+        Capture(which);
+        return Questions() != before;
+    }
+    /// Windows that have moved come to rest.
+    void Rest() {
+        for (int i = 0; i < 3; ++i) {
+            clock->Advance(ms(501));
+            Capture();
+        }
+        EXPECT_EQ(Capture(), 0u);
+    }
+
+    CManualClockScope clock;
+    CSettingsScope settings;
+    CServedScene desktop{Beginning()};
+    std::shared_ptr<ShareCapturerContext> context = std::make_shared<ShareCapturerContextMac>();
+    ShareCapturerTovel backEnd;
+    std::array<ShareRef<CShareFrame>, 2> frames;
+};
+
+class StandingPicture : public testing::Test, protected CStandingBench {};
+
+/// Something that a picture goes by.
+struct Cause {
+    const char* name;
+    void (*change)(CStandingBench& bench);
+};
+
+std::ostream& operator<<(std::ostream& out, const Cause& cause) {
+    return out << cause.name;
+}
+
+const Cause CAUSES[] = {
+    {"APainting", [](auto& b) { b.desktop->SetContent(WINDOW, SimulatedContent::Colour(0x0000FF)); }},
+    {"AWindowThatMoves",
+     [](auto& b) {
+         b.desktop->MoveWindow(WINDOW, {20, 20});
+     }},
+    {"AnotherTitle", [](auto& b) { b.desktop->SetTitle(WINDOW, "Letter"); }},
+    {"ThePointersPlace",
+     [](auto& b) {
+         b.desktop->SetPointer(CGPoint{12, 12});
+     }},
+    {"AnotherCursor", [](auto& b) { b.desktop->SetCursor(SquareCursor(0x123456)); }},
+    {"AnotherDisplay",
+     [](auto& b) {
+         b.desktop->ResizeDisplay(SIDE, {70, 50});
+     }},
+    {"AnApplicationThatEnds", [](auto& b) { b.desktop->EndApplication(NOTES); }},
+    {"ALostServer", [](auto& b) { b.desktop->Lose(); }},
+    {"AStalledServer", [](auto& b) { b.desktop->Stall(); }},
+    {"WhatMovesByItself",
+     [](auto& b) {
+         b.desktop->SetContent(WINDOW, SimulatedContent::Moving(ms(100), [](int, int, std::uint64_t frame) {
+                                   return Opaque(frame % 2 == 0 ? 0xFF0000 : 0x00FF00);
+                               }));
+     }},
+    {"ACallThatIsToFail", [](auto& b) { b.desktop->FailNext(SimulatedOperation::TakeWindowPicture); }},
+    {"AWindowKeptOut", [](auto& b) { b.context->AddUnSharedWindow(WINDOW); }},
+    {"AnApplicationKeptOut", [](auto& b) { b.context->AddUnSharedApp(static_cast<unsigned>(EDITOR)); }},
+    {"AnotherShareType", [](auto& b) { b.context->SetShareType(SHARE_TYPE_APP); }},
+    {"TheAreaOfWindows", [](auto& b) { b.context->m_bNoWindowBaseArea = false; }},
+    {"MenuBarsLeftOut", [](auto& b) { b.context->m_bExcludeMenuBar = true; }},
+    {"ExposedRegionsWanted", [](auto& b) { b.context->m_bFindsExposed = true; }},
+    {"AnotherWalk",
+     [](auto& b) {
+         b.context->AddUnSharedWindow(WINDOW);
+         b.context->UpdateShareCapturerContext();
+         b.context->RemoveUnSharedWindow(WINDOW);
+     }},
+    {"TheDisplayCaptured", [](auto& b) { b.backEnd.setCaptureDisplay(SIDE); }},
+    {"TheLimit",
+     [](auto& b) {
+         b.backEnd.setMaxSize({60, 40});
+     }},
+    {"TheFlags", [](auto& b) { b.settings->m_nShareConfigFlags = SHARE_CONFIG_FLAG_NO_POINTER; }},
+    {"NoWalks", [](auto& b) { b.settings->m_nShareConfigFlags = SHARE_CONFIG_FLAG_NO_WINDOW_WALK; }},
+    {"TimesTraced", [](auto& b) { b.settings->m_nShareConfigFlags = SHARE_CONFIG_FLAG_PERFORMANCE_TRACE; }},
+    {"TheScale", [](auto& b) { b.settings->SetCurrentScale(0.5F); }},
+    {"TheBackground", [](auto& b) { b.settings->m_nAppShareBackgroundColor = 0x102030; }},
+    {"TheDisplayRule", [](auto& b) { b.settings->m_bAppDisplayByWindow = false; }},
+    {"NoResampling", [](auto& b) { b.settings->m_bCaptureResampleEnable = false; }},
+    {"AFixedSize", [](auto& b) { b.settings->m_bCaptureResampleFixSizeEnable = true; }},
+    {"AnotherFixedSize", [](auto& b) { b.settings->m_nResampleScreenCaptureWidth = 100; }},
+    {"AFrameWrittenTo",
+     [](auto& b) {
+         const std::array<unsigned char, 4> pixel{1, 2, 3, 4};
+         b.Frame().WriteFrameData(pixel.data(), static_cast<int>(pixel.size()));
+     }},
+    {"AFrameOfAnotherFormat", [](auto& b) { b.Frame().SetFrameDataFormat(SHARE_FRAME_FORMAT_ARGB); }},
+    {"AFrameThatIsReset", [](auto& b) { b.Frame().Reset(); }},
+};
+
+class StandingPictureEnds : public StandingPicture, public testing::WithParamInterface<Cause> {};
+
+} // namespace
+
+TEST_F(StandingPicture, IsCapturedAnewWithoutAQuestion) {
+    Rest();
+    EXPECT_FALSE(Asks());
+    clock->Advance(ms(33));
+    Frame().SetMetaInfo({});
+    EXPECT_EQ(Capture(), 0u);
+    EXPECT_EQ(Frame().GetTimestamp(), ShareUtil::GetCaptureFrameTimeStamp());
+    EXPECT_EQ(Frame().GetMetaInfo().rectCapture, (TVLRect{0, 0, 120, 80}));
+    EXPECT_TRUE(Frame().GetMetaInfo().bPointerCaptured);
+    EXPECT_EQ(backEnd.pointerCaptured(), 1);
+    EXPECT_EQ(PixelAt(Frame(), 20, 20), Rgb(0x00FF00));
+}
+
+TEST_F(StandingPicture, IsDrawnOnceIntoEachFrame) {
+    Rest();
+    EXPECT_TRUE(Asks(1));
+    EXPECT_FALSE(Asks(1));
+    EXPECT_FALSE(Asks(0)) << "both show it";
+    EXPECT_TRUE(Frame(0).HasSameData(Frame(1)));
+}
+
+TEST_F(StandingPicture, IsNotKnownWhereTheServerDoesNotTell) {
+    desktop->TellMoments(false);
+    Rest();
+    EXPECT_TRUE(Asks());
+}
+
+TEST_F(StandingPicture, IsNotKnownInAFrameThatKeepsNoNote) {
+    const FrameRef plain = NewFrameRef();
+    for (int i = 0; i < 3; ++i) {
+        const unsigned before = Questions();
+        EXPECT_EQ(backEnd.captureToIShareFrame(plain.Get()), 0u);
+        EXPECT_NE(Questions(), before);
+    }
+}
+
+TEST_F(StandingPicture, IsMadeEachTimeForTheLinesThatItTraces) {
+    Rest();
+    const CTraceLog trace; // at the most detailed level
+    EXPECT_TRUE(Asks());
+    EXPECT_TRUE(trace.Contains("UpdateShareCapturerContext begin"));
+}
+
+TEST_F(StandingPicture, IsNotTakenForTheNextOneWhileItIsMade) {
+    for (const auto operation : {SimulatedOperation::GetWindows, SimulatedOperation::TakeWindowPicture}) {
+        Rest();
+        desktop->SetContent(WINDOW, SimulatedContent::Colour(0x112233));
+        desktop->DoAt(operation, 1, [this] { context->AddUnSharedWindow(WINDOW); });
+        Capture();
+        clock->Advance(ms(501));
+        EXPECT_TRUE(Asks()) << "it may show what is kept out";
+        Rest();
+        EXPECT_EQ(CountOf(Frame(), 0x112233), 0);
+        context->RemoveUnSharedWindow(WINDOW);
+    }
+}
+
+TEST_F(StandingPicture, DoesNotStandForAWalkOverFormerWindows) {
+    Rest();
+    desktop->SetContent(WINDOW, SimulatedContent::Colour(0x112233));
+    // Behind the walk and the list of what is captured, ahead of the picture.
+    desktop->DoAt(SimulatedOperation::TakeWindowPicture, 1, [this] { desktop->SetTitle(WINDOW, "Letter"); });
+    EXPECT_EQ(Capture(), 0u);
+    EXPECT_TRUE(Asks());
+    EXPECT_FALSE(Asks());
+}
+
+TEST_F(StandingPicture, IsOfOneWindowServer) {
+    Rest();
+    const CServedScene other(Beginning()); // without the editor's window
+    other->TellMoments(true);
+    clock->Advance(ms(501));
+    Capture();
+    clock->Advance(ms(501));
+    EXPECT_EQ(Capture(), 0u);
+    EXPECT_EQ(CountOf(Frame(), 0x00FF00), 0);
+}
+
+TEST_P(StandingPictureEnds, WithEachChangeOfWhatItGoesBy) {
+    Rest();
+    ASSERT_FALSE(Asks());
+    GetParam().change(*this);
+    const unsigned before = Questions();
+    const bool wasAnswered = Capture() == 0 && Questions() == before;
+    EXPECT_FALSE(wasAnswered);
+}
+
+INSTANTIATE_TEST_SUITE_P(Causes, StandingPictureEnds, testing::ValuesIn(CAUSES),
+                         [](const auto& each) { return std::string(each.param.name); });
+
+// ---- Beside pictures drawn from scratch
+
+namespace {
+
+/// The back-end on a desktop on which anything may happen, and mostly nothing does.
+class StandingPictureOracle : public StandingPicture {
+protected:
+    void Step() {
+        if (m_dice.OneIn(3))
+            m_desk.Change();
+        if (m_dice.OneIn(15))
+            ChangeShare();
+        if (m_dice.OneIn(40))
+            desktop->TellMoments(m_dice.OneIn(4));
+        else
+            desktop->TellMoments(true);
+        clock->Advance(ms(m_dice.OneIn(3) ? 501 : 33));
+        const auto which = static_cast<std::size_t>(m_dice.Between(0, 1));
+        const unsigned before = Questions();
+        if (Capture(which) != 0)
+            return;
+        ++pictures;
+        if (Questions() == before)
+            ++standing;
+        Judge(Frame(which));
+    }
+
+    int pictures = 0;
+    int standing = 0;
+
+private:
+    void ChangeShare() {
+        const auto window = static_cast<unsigned>(m_desk.AnyWindow());
+        switch (m_dice.Between(0, 6)) {
+            case 0:
+                context->AddUnSharedWindow(window);
+                return;
+            case 1:
+            case 2:
+                context->RemoveUnSharedWindow(window);
+                return;
+            case 3:
+                backEnd.setMaxSize({m_dice.Between(40, 130), m_dice.Between(40, 90)});
+                return;
+            case 4:
+                backEnd.setMaxSize({1920, 1080});
+                return;
+            case 5:
+                settings->m_nAppShareBackgroundColor = m_dice.Between(0, 0xFFFFFF);
+                return;
+            default:
+                context->SetShareType(m_dice.OneIn(2) ? SHARE_TYPE_DESKTOP : SHARE_TYPE_APP);
+        }
+    }
+    void Judge(CShareFrame& frame) {
+        CShareCGSCapturer composition(context);
+        composition.setMaxSize(SizeOf(frame));
+        const FrameRef scratch = NewFrameRef();
+        ASSERT_EQ(composition.capture(scratch.Get(), MAIN, SizeOf(frame), SizeOf(frame)), 0);
+        const int bytes = CShareFrame::BackedDataLen(frame);
+        ASSERT_EQ(bytes, CShareFrame::BackedDataLen(*scratch.Get()));
+        EXPECT_EQ(
+            std::memcmp(frame.GetFrameData(), scratch.Get()->GetFrameData(), static_cast<std::size_t>(bytes)),
+            0)
+            << "picture " << pictures;
+        EXPECT_EQ(frame.GetMetaInfo().rectCapture, scratch.Get()->GetMetaInfo().rectCapture);
+        EXPECT_EQ(frame.GetMetaInfo().bPointerCaptured, scratch.Get()->GetMetaInfo().bPointerCaptured);
+    }
+
+    CPaintedDesk m_desk{*desktop.operator->(), 4711};
+    CDice& m_dice = m_desk.dice;
+};
+
+} // namespace
+
+TEST_F(StandingPictureOracle, ShowsWhatIsDrawnFromScratch) {
+    const int steps = TestRounds(3000);
+    for (const pid_t pid : {EDITOR, NOTES})
+        context->AddSharedApp(static_cast<unsigned>(pid));
+    context->SetShareType(SHARE_TYPE_DESKTOP);
+    for (int i = 0; i < steps && !HasFailure(); ++i)
+        Step();
+    std::cout << steps << " steps, seed 4711: " << pictures << " pictures, " << standing
+              << " of them stood\n";
+    EXPECT_GT(pictures, steps / 3);
+    EXPECT_GT(standing, steps / 10);
+}
