@@ -27,6 +27,26 @@ enum CGWindowImageOption : unsigned {
 struct CGWindowImage;
 using CGWindowImageRef = std::shared_ptr<const CGWindowImage>;
 
+/// An image of windows to be had again without holding on to its pictures meanwhile: the window server may
+/// write over them, or let them go.
+/// Threads: one at a time.
+class CGWindowImageMemo {
+public:
+    CGWindowImageMemo();
+    ~CGWindowImageMemo();
+    CGWindowImageMemo(const CGWindowImageMemo&) = delete;
+    CGWindowImageMemo& operator=(const CGWindowImageMemo&) = delete;
+
+    void Keep(const CGWindowImage* image) noexcept;
+    /// The image; null once the window server's moment is another than when it was taken, when it had none,
+    /// and when memory runs out.
+    CGWindowImageRef Recall() const noexcept;
+
+private:
+    struct Kept;
+    std::unique_ptr<Kept> m_kept; // null for none
+};
+
 /// `rect` is in global points. Windows that don't exist any more are left out. `keepsOut` tells whether the
 /// asker keeps anything out, listed or not: a window server that can only give whole displays then gives
 /// nothing. Null for no window, for a rectangle without an area, and when the window server gives no picture.

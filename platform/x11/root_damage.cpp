@@ -13,7 +13,7 @@ namespace platform::x11 {
 namespace {
 
 /// Of more rectangles than that, only what lies around them is taken.
-constexpr std::size_t MOST_RECTANGLES = 256;
+constexpr std::size_t MOST_TOLD_RECTANGLES = 256;
 
 PixelRect RectFrom(const xcb_rectangle_t& rect) {
     return {rect.x, rect.y, rect.x + rect.width, rect.y + rect.height};
@@ -88,7 +88,7 @@ PixelRegion RootDamage::Await(Question& question) {
 PixelRegion RootDamage::RegionFrom(const xcb_xfixes_fetch_region_reply_t& reply) {
     const std::span<const std::uint8_t> bytes = BytesBehind(reply);
     const std::size_t count = bytes.size() / sizeof(xcb_rectangle_t);
-    if (count > MOST_RECTANGLES)
+    if (count > MOST_TOLD_RECTANGLES)
         return PixelRegion(RectFrom(reply.extents));
     PixelRegion region;
     for (std::size_t i = 0; i < count; ++i) {

@@ -81,6 +81,7 @@ struct CShareCGSCapturer::Pass {
     int background = BLACK; // read once: the note tells the colour that was painted
     platform::CGRect place; // where the image goes, counted from the bottom of the frame
     std::optional<ShareCursorDrawing> pointer;
+    bool hasPlaces = false; // these two are known
 
     /// Whether the image leaves nothing of what is where the context can be painted on now.
     bool CoversClip(const platform::CGContext* context) const {
@@ -166,20 +167,56 @@ int CShareCGSCapturer::capture(IShareFrame* frame, unsigned display, TVLSize bit
     if (IsWindowArea())
         FitToWindows(pass);
 
-    auto* const own = dynamic_cast<CShareFrame*>(frame);
+    PutInto(*frame, pass);
+    KeepPass(pass);
+    return SHARE_CAPTURE_OK;
+}
+
+bool CShareCGSCapturer::captureAgain(IShareFrame& frame) {
+    if (m_lastPass == nullptr)
+        return false;
+    Pass pass = *m_lastPass;
+    pass.image = m_lastImage.Recall();
+    if (pass.image == nullptr)
+        return false;
+    PutInto(frame, pass);
+    return true;
+}
+
+void CShareCGSCapturer::PutInto(IShareFrame& frame, Pass& pass) {
+    auto* const own = dynamic_cast<CShareFrame*>(&frame);
     std::unique_ptr<ShareCompositionNote> before = own != nullptr ? TakeNote(*own) : nullptr;
-    PrepareFrame(*frame, pass);
+    PrepareFrame(frame, pass);
     m_rectLastCapture = pass.drawRect;
-    if (pass.image != nullptr) {
-        pass.place = PlaceOf(pass);
-        FindPointer(pass);
-    }
+    if (!pass.hasPlaces)
+        FindPlaces(pass);
     Show(pass, own, before.get());
     if (m_note == nullptr)
         m_note = std::move(before);
     m_nDrawnMoment = platform::CGWindowImageGetMoment(pass.image.get());
-    frame->SetMetaInfo({ShareUtilMac::CGRectToTVLRect(pass.drawRect), m_bPointerCaptured});
-    return SHARE_CAPTURE_OK;
+    frame.SetMetaInfo({ShareUtilMac::CGRectToTVLRect(pass.drawRect), m_bPointerCaptured});
+}
+
+/// Where the picture and the pointer go in a frame that is ready for them.
+void CShareCGSCapturer::FindPlaces(Pass& pass) {
+    if (pass.image == nullptr)
+        return;
+    pass.place = PlaceOf(pass);
+    FindPointer(pass);
+    pass.hasPlaces = true;
+}
+
+void CShareCGSCapturer::KeepPass(const Pass& pass) {
+    m_lastImage.Keep(pass.image.get());
+    if (m_nDrawnMoment == 0) {
+        m_lastPass.reset();
+        return;
+    }
+    if (m_lastPass == nullptr)
+        m_lastPass = std::make_unique<Pass>(pass);
+    else
+        *m_lastPass = pass;
+    m_lastPass->image = nullptr;
 }
 
 /// Null also for a note of somebody else.

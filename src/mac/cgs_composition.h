@@ -51,6 +51,9 @@ public:
     /// 0 with the frame filled; anything else leaves it as it was. A share without windows is no failure: it
     /// gives its background.
     int capture(IShareFrame* frame, unsigned display, TVLSize bitmap, TVLSize capture);
+    /// The same picture as the last one, in this frame. False, and the frame as it was, when the window
+    /// server may have another by now. The caller answers for all else that it was made from.
+    bool captureAgain(IShareFrame& frame);
 
     /// Has the bitmap context lie on that memory, `length` bytes; there is none if that is too short.
     void initCapturerByData(unsigned char* data, unsigned long length, TVLSize size);
@@ -92,6 +95,9 @@ private:
     void FindPointer(Pass& pass);
     static std::unique_ptr<ShareCompositionNote> TakeNote(CShareFrame& frame);
     void PrepareFrame(IShareFrame& frame, const Pass& pass);
+    void FindPlaces(Pass& pass);
+    void PutInto(IShareFrame& frame, Pass& pass);
+    void KeepPass(const Pass& pass);
 
     /// Makes the frame show what the pass has found.
     void Show(const Pass& pass, CShareFrame* frame, const ShareCompositionNote* before);
@@ -116,6 +122,8 @@ private:
     /// Of this pass while it lasts, then any that can be written over.
     std::unique_ptr<ShareCompositionNote> m_note;
     std::unique_ptr<ShareCompositionNote> m_lastDescribed; // has a number
+    std::unique_ptr<Pass> m_lastPass; // without its image; null where that can't be had again
+    platform::CGWindowImageMemo m_lastImage;
     std::uint64_t m_nDrawnMoment = 0;
     bool m_bPointerCaptured = false;
 };

@@ -2,10 +2,12 @@
 #include "src/mac/share_capturer_tovel.h"
 
 #include "src/app_share_config.h"
+#include "src/share_util.h"
 #include "util/cm_guarded_call.h"
 #include "util/cm_trace.h"
 
 #include <screenshare/share_capturer.h>
+#include <screenshare/share_frame.h>
 
 #include <cstdint>
 
@@ -26,12 +28,23 @@ unsigned ShareCapturerTovel::captureToIShareFrame(IShareFrame* frame) {
     if (frame == nullptr || m_cgsCapturer == nullptr)
         return static_cast<unsigned>(SHARE_CAPTURE_FAILED);
     int result = SHARE_CAPTURE_FAILED;
-    CmCallGuarded("[ShareCapturerTovel::captureToIShareFrame]>>fail>>", [&] {
-        const std::optional<ShareStandingPicture::Terms> terms = TermsInForce();
-        const bool isThere = terms && m_standing.IsIn(*frame, *terms);
-        result = isThere ? SHARE_CAPTURE_OK : CaptureAnew(*frame);
-    });
+    CmCallGuarded("[ShareCapturerTovel::captureToIShareFrame]>>fail>>",
+                  [&] { result = CaptureAgain(*frame) ? SHARE_CAPTURE_OK : CaptureAnew(*frame); });
     return static_cast<unsigned>(result);
+}
+
+/// False when there has to be another picture.
+bool ShareCapturerTovel::CaptureAgain(IShareFrame& frame) {
+    const std::optional<ShareStandingPicture::Terms> terms = TermsInForce();
+    if (!terms || !m_standing.IsOf(*terms))
+        return false;
+    if (m_standing.IsIn(frame, *terms))
+        return true;
+    const std::lock_guard<std::mutex> lock(m_bmpContextLock);
+    if (!m_cgsCapturer->captureAgain(frame))
+        return false;
+    frame.SetTimestamp(ShareUtil::GetCaptureFrameTimeStamp());
+    return true;
 }
 
 int ShareCapturerTovel::CaptureAnew(IShareFrame& frame) {

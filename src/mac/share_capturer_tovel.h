@@ -25,6 +25,7 @@ public:
 private:
     /// Nothing while each capture has to be made.
     std::optional<ShareStandingPicture::Terms> TermsInForce();
+    bool CaptureAgain(IShareFrame& frame);
     int CaptureAnew(IShareFrame& frame);
 
     std::mutex m_bmpContextLock; // held throughout a picture

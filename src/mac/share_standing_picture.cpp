@@ -31,7 +31,7 @@ std::optional<ShareStandingPicture::Terms> ShareStandingPicture::TermsOf(
 }
 
 bool ShareStandingPicture::IsIn(IShareFrame& frame, const Terms& terms) const {
-    if (m_nMoment == 0 || terms != m_terms)
+    if (!IsOf(terms))
         return false;
     auto* const own = dynamic_cast<CShareFrame*>(&frame);
     if (own == nullptr || !own->AllowsNote() || own->NoteNumber() != m_nNote ||

@@ -44,6 +44,8 @@ public:
     /// Whether a frame shows what a capture on these terms would have it show now. It then counts as captured
     /// anew.
     bool IsIn(IShareFrame& frame, const Terms& terms) const;
+    /// Whether it is of these terms; that leaves the window server.
+    bool IsOf(const Terms& terms) const { return m_nMoment != 0 && terms == m_terms; }
 
     /// A picture was made on these terms, all along, and the frame shows it. `moment` is the window server's.
     void Keep(IShareFrame& frame, const Terms& terms, std::uint64_t moment);

@@ -1,4 +1,5 @@
 // SPDX-License-Identifier: Apache-2.0
+#include "platform/core_graphics_images.h"
 #include "src/mac/cgs_composition.h"
 #include "src/mac/share_capturer_context_mac.h"
 #include "src/mac/share_capturer_tovel.h"
@@ -13,11 +14,14 @@
 
 #include <gtest/gtest.h>
 
+#include <algorithm>
 #include <array>
 #include <chrono>
 #include <cstddef>
 #include <cstdint>
 #include <cstring>
+#include <functional>
+#include <initializer_list>
 #include <iostream>
 #include <memory>
 #include <ostream>
@@ -156,13 +160,6 @@ const Cause CAUSES[] = {
     {"NoResampling", [](auto& b) { b.settings->m_bCaptureResampleEnable = false; }},
     {"AFixedSize", [](auto& b) { b.settings->m_bCaptureResampleFixSizeEnable = true; }},
     {"AnotherFixedSize", [](auto& b) { b.settings->m_nResampleScreenCaptureWidth = 100; }},
-    {"AFrameWrittenTo",
-     [](auto& b) {
-         const std::array<unsigned char, 4> pixel{1, 2, 3, 4};
-         b.Frame().WriteFrameData(pixel.data(), static_cast<int>(pixel.size()));
-     }},
-    {"AFrameOfAnotherFormat", [](auto& b) { b.Frame().SetFrameDataFormat(SHARE_FRAME_FORMAT_ARGB); }},
-    {"AFrameThatIsReset", [](auto& b) { b.Frame().Reset(); }},
 };
 
 class StandingPictureEnds : public StandingPicture, public testing::WithParamInterface<Cause> {};
@@ -184,10 +181,18 @@ TEST_F(StandingPicture, IsCapturedAnewWithoutAQuestion) {
 
 TEST_F(StandingPicture, IsDrawnOnceIntoEachFrame) {
     Rest();
-    EXPECT_TRUE(Asks(1));
+    EXPECT_FALSE(Asks(1)) << "the window server's pictures are still there";
+    EXPECT_EQ(Frame(1).GetTimestamp(), ShareUtil::GetCaptureFrameTimeStamp());
+    EXPECT_EQ(Frame(1).GetMetaInfo().rectCapture, (TVLRect{0, 0, 120, 80}));
+    EXPECT_TRUE(Frame(1).GetMetaInfo().bPointerCaptured);
+    EXPECT_EQ(Frame(0).NoteNumber(), Frame(1).NoteNumber()) << "both show it";
+    Frame(1).Reset(); // without its note it may hold anything
+    std::fill_n(Frame(1).GetFrameData(), CShareFrame::BackedDataLen(Frame(1)),
+                static_cast<unsigned char>(0xA5));
     EXPECT_FALSE(Asks(1));
-    EXPECT_FALSE(Asks(0)) << "both show it";
-    EXPECT_TRUE(Frame(0).HasSameData(Frame(1)));
+    EXPECT_EQ(std::memcmp(Frame(0).GetFrameData(), Frame(1).GetFrameData(),
+                          static_cast<std::size_t>(CShareFrame::BackedDataLen(Frame(1)))),
+              0);
 }
 
 TEST_F(StandingPicture, IsNotKnownWhereTheServerDoesNotTell) {
@@ -245,6 +250,37 @@ TEST_F(StandingPicture, IsOfOneWindowServer) {
     clock->Advance(ms(501));
     EXPECT_EQ(Capture(), 0u);
     EXPECT_EQ(CountOf(Frame(), 0x00FF00), 0);
+}
+
+TEST_F(StandingPicture, IsDrawnAgainIntoAFrameThatHasLostIt) {
+    Rest();
+    const std::array<unsigned char, 4> pixel{1, 2, 3, 4};
+    for (const auto& spoil : std::initializer_list<std::function<void()>>{
+             [&] { Frame().WriteFrameData(pixel.data(), static_cast<int>(pixel.size())); },
+             [&] { Frame().SetFrameDataFormat(SHARE_FRAME_FORMAT_ARGB); },
+             [&] { Frame().SetFrameSize(10, 10); },
+         }) {
+        EXPECT_EQ(Capture(1), 0u);
+        spoil();
+        EXPECT_FALSE(Asks());
+        EXPECT_EQ(SizeOf(Frame()), SizeOf(Frame(1)));
+        EXPECT_EQ(Frame().GetFrameDataFormat(), SHARE_FRAME_FORMAT_RGBA);
+        EXPECT_EQ(std::memcmp(Frame(0).GetFrameData(), Frame(1).GetFrameData(),
+                              static_cast<std::size_t>(CShareFrame::BackedDataLen(Frame(1)))),
+                  0);
+    }
+}
+
+TEST_F(StandingPicture, IsHadAgainOnlyAtItsMoment) {
+    Rest();
+    const CGWindowID windows[] = {WINDOW};
+    const CGWindowImageRef image = CGWindowListTakeImage({{0, 0}, {120, 80}}, windows, 0, false);
+    ASSERT_NE(image, nullptr);
+    CGWindowImageMemo memo;
+    memo.Keep(image.get());
+    EXPECT_EQ(CGWindowImageGetMoment(memo.Recall().get()), CGWindowImageGetMoment(image.get()));
+    desktop->SetTitle(WINDOW, "Letter");
+    EXPECT_EQ(memo.Recall(), nullptr) << "of a former moment";
 }
 
 TEST_P(StandingPictureEnds, WithEachChangeOfWhatItGoesBy) {
