@@ -63,6 +63,10 @@ PicturePtr Wallpaper::Fetch(const FetchTools& tools, const ServerPixels& pixels,
     return PictureOf(pixels, block, width, all, PixelRegion(all), shown);
 }
 
+std::chrono::nanoseconds Wallpaper::FreshUntil() const {
+    return m_picture != nullptr ? m_fetched + FRESH_TIME : std::chrono::nanoseconds{0};
+}
+
 std::optional<std::chrono::nanoseconds> Wallpaper::NextDue() const {
     if (m_picture == nullptr)
         return std::nullopt;

@@ -23,6 +23,8 @@ public:
     /// were fetched for it.
     PicturePtr Take(const FetchTools& tools, const ServerPixels& pixels, xcb_pixmap_t pixmap,
                     const CGRect& frame, std::size_t& fetched);
+    /// Until then the same is given; at once where there is none.
+    std::chrono::nanoseconds FreshUntil() const;
     std::size_t KeptBytes() const { return m_picture != nullptr ? m_bytes : 0; }
     /// When it is to be dropped, since nobody has asked for it.
     std::optional<std::chrono::nanoseconds> NextDue() const;

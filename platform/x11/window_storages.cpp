@@ -164,6 +164,7 @@ std::optional<ServerPixels> WindowStorages::State::PixelsOf(std::uint8_t depth, 
 void WindowStorages::State::CountTraffic(std::size_t bytes) {
     if (bytes == 0)
         return;
+    hasFetched = true;
     ++traffic.fetches;
     traffic.bytes += bytes;
 }
@@ -205,6 +206,7 @@ void WindowStorages::State::Trim() {
             return;
         kept -= storage->KeptBytes();
         storage->Drop();
+        hasFetched = true;
     }
 }
 
@@ -352,12 +354,12 @@ std::optional<std::chrono::nanoseconds> WindowStorages::NextDue() const {
     return state.due && (!next || *state.due < *next) ? state.due : next;
 }
 
-void WindowStorages::DoDue() {
+bool WindowStorages::DoDue() {
     State& state = *m_state;
     const Nanoseconds now = CmSteadyNow();
     const std::optional<Nanoseconds> due = NextDue();
     if (!due || *due > now)
-        return;
+        return false;
     state.isDueKnown = false;
     for (const auto& [window, storage] : state.storages)
         storage->DoDue(now);
@@ -365,6 +367,7 @@ void WindowStorages::DoDue() {
     state.Trim();
     state.pool.Drop(now - IDLE_TIME);
     state.connection.Flush();
+    return true;
 }
 
 WindowStorages::Traffic WindowStorages::TrafficSoFar() const {

@@ -15,6 +15,15 @@
 
 namespace platform::x11 {
 
+/// A picture of windows, and what is known of it.
+struct TakenPicture {
+    PictureOutcome outcome = PictureOutcome::Failed;
+    std::shared_ptr<WindowPicture> picture; ///< Null unless Ok. Without a moment.
+    /// Until then the same would be taken again, as long as no event comes; nothing when that can't be told.
+    std::optional<std::chrono::nanoseconds> standsUntil;
+    bool hasFetched = false; ///< Pixels have been fetched, or let go of.
+};
+
 /// The pictures of windows, from their own storage.
 ///
 /// The server keeps the storage of each child of the root apart (Composite), so a covered window is whole.
@@ -59,7 +68,8 @@ public:
     bool OnEvent(const xcb_generic_event_t& event);
     /// When a window is to be asked to paint, or the cache to be looked through.
     std::optional<std::chrono::nanoseconds> NextDue() const;
-    void DoDue();
+    /// True when something was due.
+    bool DoDue();
 
     /// Asks for the damage of windows that are known to have changed, so that the next answer of the server
     /// brings it along and a picture needn't wait for it once more.
@@ -70,8 +80,8 @@ public:
     /// whose pixels nobody here can read, has no layer; one trace tells so.
     /// `pointer` is where the pointer is, in points, if that is known.
     /// `catchUp` has the session take in every event that is here.
-    WindowPictureResult Take(const WindowPictureRequest& request, WindowTree& tree,
-                             const std::optional<CGPoint>& pointer, const std::function<void()>& catchUp);
+    TakenPicture Take(const WindowPictureRequest& request, WindowTree& tree,
+                      const std::optional<CGPoint>& pointer, const std::function<void()>& catchUp);
 
     /// Whether windows show nothing but their own pixels in `place`, a part of the root. A new window, or one
     /// that has grown, shows on the screen as well what lay behind it, until it has painted. Windows that are

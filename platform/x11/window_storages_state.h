@@ -54,6 +54,7 @@ struct WindowStorages::State {
     bool hasTracedPixels = false;
     bool hasTracedSize = false;
     Traffic traffic;
+    bool hasFetched = false; // pixels have been fetched, or let go of, for the picture in the making
     std::chrono::nanoseconds lastTrim{0};
     std::chrono::nanoseconds lastPainted = std::chrono::nanoseconds::min();
     // When something is due, as long as nothing has come that could make it earlier. What is asked for again

@@ -54,7 +54,7 @@ public:
     }
 
     /// Nothing when the stack has changed meanwhile.
-    std::optional<WindowPictureResult> Try(const std::function<void()>& catchUp);
+    std::optional<TakenPicture> Try(const std::function<void()>& catchUp);
 
 private:
     /// A layer in the making.
@@ -75,7 +75,8 @@ private:
     bool IsTooLarge(const TopLevel& window);
     void Fetch();
     bool IsStillTrue(const std::function<void()>& catchUp);
-    WindowPictureResult Result();
+    TakenPicture Result();
+    static bool Stands(const Part& part);
 
     State& m_state;
     const CGRect m_rect;
@@ -84,11 +85,12 @@ private:
     const std::optional<CGPoint> m_pointer;
     std::uint64_t m_generation = 0;
     bool m_anyExists = false;
+    std::chrono::nanoseconds m_standsUntil = std::chrono::nanoseconds::max();
     std::vector<Part> m_parts; // back to front
     std::vector<StorageFetch> m_fetches;
 };
 
-std::optional<WindowPictureResult> WindowStorages::Taking::Try(const std::function<void()>& catchUp) {
+std::optional<TakenPicture> WindowStorages::Taking::Try(const std::function<void()>& catchUp) {
     if (!SettleTree(catchUp))
         return std::nullopt;
     const std::shared_ptr<const WindowSnapshot> snapshot = m_tree.Snapshot();
@@ -145,6 +147,7 @@ void WindowStorages::Taking::AddWallpaper(const WindowInfo& info) {
         m_state.wallpaper.Take(m_state.Tools(), *pixels, m_tree.Wallpaper(), info.frame, fetched);
     m_state.CountTraffic(fetched);
     m_state.isDueKnown = m_state.isDueKnown && fetched == 0;
+    m_standsUntil = m_state.wallpaper.FreshUntil();
     if (part.layer.picture == nullptr)
         return;
     part.layer.frame = {info.frame.origin, part.layer.picture->rect.size};
@@ -223,20 +226,45 @@ bool WindowStorages::Taking::IsStillTrue(const std::function<void()>& catchUp) {
     return !isRenewed && m_tree.Generation() == m_generation;
 }
 
-WindowPictureResult WindowStorages::Taking::Result() {
+/// Time alone doesn't change what a picture of it shows.
+bool WindowStorages::Taking::Stands(const Part& part) {
+    if (part.storage == nullptr)
+        return !part.layer.stale && part.layer.picture->serial != 0;
+    if (part.layer.picture == nullptr || part.layer.picture->serial == 0 ||
+        !part.storage->IsCurrent(part.pixels))
+        return false;
+    if (part.storage->Proof().IsProven())
+        return true;
+    PixelRegion missing = part.storage->Proof().Unproven();
+    missing.Intersect(part.visible);
+    if (part.shape)
+        missing.Intersect(*part.shape);
+    return missing.IsEmpty();
+}
+
+TakenPicture WindowStorages::Taking::Result() {
+    TakenPicture taken;
+    taken.outcome = PictureOutcome::Gone;
     if (!m_anyExists)
-        return {PictureOutcome::Gone, nullptr};
+        return taken;
     auto picture = std::make_shared<WindowPicture>();
+    bool stands = true;
     for (Part& part : m_parts) {
         if (part.storage != nullptr)
             part.layer.picture = part.storage->Show(part.visible, part.shape, part.layer.frame);
+        stands = stands && Stands(part);
         if (part.layer.picture != nullptr)
             picture->layers.push_back(std::move(part.layer));
     }
     picture->time = CmSteadyNow();
     picture->generation = m_generation;
     picture->pointer = m_pointer;
-    return {PictureOutcome::Ok, std::move(picture)};
+    taken.outcome = PictureOutcome::Ok;
+    taken.picture = std::move(picture);
+    if (stands)
+        taken.standsUntil = m_standsUntil;
+    taken.hasFetched = m_state.hasFetched;
+    return taken;
 }
 
 void WindowStorages::AskAhead() {
@@ -246,12 +274,15 @@ void WindowStorages::AskAhead() {
     }
 }
 
-WindowPictureResult WindowStorages::Take(const WindowPictureRequest& request, WindowTree& tree,
-                                         const std::optional<CGPoint>& pointer,
-                                         const std::function<void()>& catchUp) {
+TakenPicture WindowStorages::Take(const WindowPictureRequest& request, WindowTree& tree,
+                                  const std::optional<CGPoint>& pointer,
+                                  const std::function<void()>& catchUp) {
     const Extensions& has = m_state->connection.Has();
+    TakenPicture none;
+    none.outcome = PictureOutcome::Unsupported;
     if (!has.composite || !has.damage || !has.xfixes)
-        return {PictureOutcome::Unsupported, nullptr};
+        return none;
+    m_state->hasFetched = false;
     m_state->Trim();
     for (int i = 0; i < FREE_TRIES; ++i) {
         if (auto result = Taking(*m_state, request, tree, pointer).Try(catchUp))
@@ -262,7 +293,9 @@ WindowPictureResult WindowStorages::Take(const WindowPictureRequest& request, Wi
     m_state->connection.RoundTrip();
     if (auto result = Taking(*m_state, request, tree, pointer).Try(catchUp))
         return *std::move(result);
-    return {PictureOutcome::Stale, nullptr};
+    none.outcome = PictureOutcome::Stale;
+    none.hasFetched = true;
+    return none;
 }
 
 // ---- The screen

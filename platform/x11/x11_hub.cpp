@@ -107,6 +107,10 @@ std::shared_ptr<const CursorImage> X11Hub::Cursor() {
     return LookAt([](const View& view) { return view.cursor; });
 }
 
+std::uint64_t X11Hub::Moment() const {
+    return InForkedChild() ? 0 : m_state->moment.Get();
+}
+
 /// False when there is none and none can be started. Also true when another one has ended it meanwhile.
 bool X11Hub::StartThread() {
     const std::lock_guard<std::mutex> threads(m_state->threadMutex);

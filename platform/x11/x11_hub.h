@@ -70,6 +70,8 @@ public:
     std::shared_ptr<const WindowSnapshot> Windows();
     std::shared_ptr<const ApplicationList> Applications();
     std::shared_ptr<const CursorImage> Cursor();
+    /// Never waits and starts nothing.
+    std::uint64_t Moment() const;
 
     /// Runs `work` on the thread and waits for it. Ok when it has run; Lost without a server that answers,
     /// and look-ups tell so by then; Timeout when the deadline has passed, which makes the server stalled

@@ -108,6 +108,7 @@ StreamReaderPtr HubState::NewReader(const DisplayStreamRequest& request, const L
 
 void HubState::Close(std::shared_ptr<NoticeReceiver>& receiver, const Lock&) {
     m_closed = true;
+    moment.End();
     m_receiver.swap(receiver);
     m_readers.clear();
     FailCommands();
@@ -251,6 +252,7 @@ void HubState::SetLife(Life life) {
     if (m_view.life.life == life)
         return;
     m_view.life.life = life;
+    moment.End();
     Tell(NoticeKind::LifeChanged);
     point.NotifyAll();
 }

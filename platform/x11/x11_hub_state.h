@@ -2,6 +2,7 @@
 #pragma once
 
 #include "platform/x11/application_watch.h"
+#include "platform/x11/standing_moment.h"
 #include "platform/x11/x11_hub.h"
 #include "platform/x11/x11_memory.h"
 #include "util/cm_clock.h"
@@ -115,6 +116,7 @@ struct HubState {
     std::vector<StreamReaderPtr> LivingReaders();
 
     CCmWaitPoint point;
+    StandingMoment moment;             // its lock is taken after the others
     std::mutex threadMutex;            // taken before the point's
     std::shared_ptr<X11Worker> thread; // guarded by threadMutex
 

@@ -99,6 +99,7 @@ void X11Session::SetComposited(bool composited) {
 
 void X11Session::Dispatch(const xcb_generic_event_t& event) {
     ++m_events;
+    EndMoment();
     const std::uint8_t fixes = m_connection.Has().xfixesEvent;
     if (fixes != 0 && (event.response_type & 0x7F) == fixes + XCB_XFIXES_SELECTION_NOTIFY) {
         m_compositorUnknown = true;
@@ -175,6 +176,14 @@ void X11Session::CatchUp(EventsFrom from) {
     Publish();
 }
 
+void X11Session::NoteLateEvents() {
+    const Event event = m_connection.NextQueuedEvent();
+    if (event == nullptr)
+        return;
+    m_unfinished = true;
+    Dispatch(*event);
+}
+
 // ---- Views out
 
 void X11Session::Publish() {
@@ -186,14 +195,17 @@ void X11Session::Publish() {
     m_treeRevision = m_tree.Revision();
     if (const auto windows = m_tree.Snapshot(); windows != m_toldWindows) {
         m_toldWindows = windows;
+        EndMoment();
         m_listener.OnWindows(windows);
     }
     if (const auto applications = m_applications.Applications(); applications != m_toldApplications) {
         m_toldApplications = applications;
+        EndMoment();
         m_listener.OnApplications(applications);
     }
     if (const auto cursor = m_pointer.Cursor(); cursor != m_toldCursor) {
         m_toldCursor = cursor;
+        EndMoment();
         m_listener.OnCursor(cursor);
     }
     NoteGeneration();
@@ -205,6 +217,7 @@ void X11Session::PublishDisplays() {
     if (displays == m_toldDisplays)
         return;
     m_toldDisplays = displays;
+    EndMoment();
     m_streams.OnDisplaysChanged(*displays);
     m_listener.OnDisplays(displays);
 }
@@ -239,7 +252,8 @@ std::optional<Nanoseconds> X11Session::NextDue() const {
 void X11Session::DoDue() {
     const Nanoseconds now = CmSteadyNow();
     m_displays.DoDue();
-    m_storages.DoDue();
+    if (m_storages.DoDue())
+        EndMoment();
     ReapApplications(now);
     Publish();
     m_streams.DoDue([this](std::uint64_t stream) { m_listener.OnStreamPicture(stream); });
@@ -283,7 +297,17 @@ std::optional<CGPoint> X11Session::InPoints(const std::optional<CGPoint>& ofRoot
 }
 
 std::optional<CGPoint> X11Session::PointerPosition() {
-    return InPoints(m_pointer.Position());
+    return InPoints(AskedPosition());
+}
+
+/// Whoever hears that a client has warped the pointer finds it there in the next picture, too.
+std::optional<CGPoint> X11Session::AskedPosition() {
+    const std::optional<CGPoint> position = m_pointer.Position();
+    if (position != m_pointer.PositionSoFar()) {
+        EndMoment();
+        m_lastAnswered.reset();
+    }
+    return position;
 }
 
 /// Whether what is known is all that there is to know: nothing has come since the server last answered, which
@@ -301,7 +325,10 @@ std::optional<CGPoint> X11Session::AskForPointer() {
     m_eventsAnswered = m_events;
     m_lastAnswered.reset();
     m_storages.AskAhead();
+    const std::optional<CGPoint> pointerSoFar = m_pointer.PositionSoFar();
     const std::optional<CGPoint> pointer = m_pointer.WatchedPosition();
+    if (pointer != pointerSoFar)
+        EndMoment();
     if (isTimed)
         m_lastAnswered = asked;
     CatchUp(EventsFrom::Answers);
@@ -311,11 +338,35 @@ std::optional<CGPoint> X11Session::AskForPointer() {
 WindowPictureResult X11Session::TakeWindowPicture(const WindowPictureRequest& request) {
     CatchUp(EventsFrom::Socket);
     const std::optional<CGPoint> pointer = IsQuiet() ? m_pointer.PositionSoFar() : AskForPointer();
-    WindowPictureResult result =
+    TakenPicture taken =
         m_storages.Take(request, m_tree, InPoints(pointer), [this] { Drain(EventsFrom::Answers); });
+    const std::uint64_t events = m_events;
     // Whoever has the picture finds the snapshot that it shows.
     CatchUp(EventsFrom::Answers);
-    return result;
+    if (m_events == events)
+        NameMoment(taken);
+    return {taken.outcome, std::move(taken.picture)};
+}
+
+/// Pictures of others who ask keep the moment that they have, as long as this one has changed nothing for
+/// them.
+void X11Session::NameMoment(TakenPicture& taken) {
+    if (taken.hasFetched)
+        EndMoment();
+    if (taken.picture == nullptr || !taken.standsUntil || *taken.standsUntil <= CmSteadyNow())
+        return;
+    if (m_moment == 0 || CmSteadyNow() >= m_momentEnds) {
+        m_moment = NewMoment();
+        m_momentEnds = *taken.standsUntil;
+    }
+    m_momentEnds = std::min(m_momentEnds, *taken.standsUntil);
+    taken.picture->moment = Moment().moment;
+}
+
+MomentSpan X11Session::Moment() const {
+    if (m_moment == 0 || m_unfinished || !m_tree.IsSettled() || !IsQuiet())
+        return {};
+    return {m_moment, std::min(m_momentEnds, *m_lastAnswered + QUIET_LIMIT)};
 }
 
 void X11Session::AttachReader(const StreamReaderPtr& reader) {
@@ -336,7 +387,7 @@ DisplayPictureResult X11Session::TakeNewest(StreamReader& reader) {
     moment.displays = displays.get();
     moment.origin = m_displays.Origin();
     if (reader.request.withPointer)
-        moment.pointer = m_pointer.Position();
+        moment.pointer = AskedPosition();
     moment.cursor = m_pointer.Cursor();
     const bool isKnown = IsPainted(reader.request.display) && !m_tree.ShowsUnlisted();
     moment.generationBefore = isKnown ? OldestShown() : 0;
@@ -354,6 +405,7 @@ DisplayPictureResult X11Session::TakeNewest(StreamReader& reader) {
 }
 
 bool X11Session::BringToFront(pid_t pid) {
+    EndMoment();
     CatchUp(EventsFrom::Socket);
     return ActivateWindowsOf(m_connection, m_tree, pid);
 }

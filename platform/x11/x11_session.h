@@ -6,6 +6,7 @@
 #include "platform/x11/display_mirror.h"
 #include "platform/x11/display_streams.h"
 #include "platform/x11/pointer_watch.h"
+#include "platform/x11/standing_moment.h"
 #include "platform/x11/window_storages.h"
 #include "platform/x11/window_tree.h"
 #include "platform/x11/x11_connection.h"
@@ -48,7 +49,7 @@ public:
     static constexpr std::chrono::nanoseconds COMPOSITOR_LAG = std::chrono::milliseconds(700);
     /// For how long pictures are taken without a word to the server, as long as it has nothing to tell: a
     /// server that stands still is found out so late, and so is a pointer that a client has warped.
-    static constexpr std::chrono::nanoseconds QUIET_LIMIT = std::chrono::milliseconds(200);
+    static constexpr std::chrono::nanoseconds QUIET_LIMIT = std::chrono::milliseconds(500);
 
     X11Session(X11Connection& connection, Memory& memory, ApplicationWatch& applications,
                SessionListener& listener);
@@ -57,6 +58,8 @@ public:
     void Begin();
     /// Takes in the events that are here and tells what is new.
     void CatchUp(EventsFrom from);
+    /// Sending may have read more: if so, something is due at once. To be called before anybody sleeps.
+    void NoteLateEvents();
     std::optional<std::chrono::nanoseconds> NextDue() const;
     void DoDue();
     /// Grows with each event that was taken in.
@@ -64,6 +67,12 @@ public:
     /// What else than the connection is to be waited on. When one is readable, DoDue has something to do.
     std::vector<int> Descriptors() const { return m_applications.Descriptors(); }
     void OnDescriptorReady() { m_processEnded = true; }
+
+    /// The moment that what has been told is of, if nothing need be asked to know that; NoteLateEvents comes
+    /// first.
+    MomentSpan Moment() const;
+    /// Work has failed half way.
+    void EndMoment() { m_moment = 0; }
 
     Availability GetCapability(Capability capability) const;
     std::optional<CGPoint> PointerPosition(); ///< In points.
@@ -90,6 +99,8 @@ private:
     void ReapApplications(std::chrono::nanoseconds now);
     std::optional<CGPoint> InPoints(const std::optional<CGPoint>& ofRoot) const;
     bool IsQuiet() const;
+    void NameMoment(TakenPicture& taken);
+    std::optional<CGPoint> AskedPosition();
     std::optional<CGPoint> AskForPointer();
     std::uint64_t OldestShown();
     bool IsPainted(CGDirectDisplayID display);
@@ -111,6 +122,9 @@ private:
     std::optional<std::chrono::nanoseconds> m_lastAnswered;
     std::uint64_t m_eventsAnswered = 0;
     bool m_unfinished = false; // more came than was taken in
+    // Of what has been told and taken since it was named; 0 for none, as whenever anything changes.
+    std::uint64_t m_moment = 0;
+    std::chrono::nanoseconds m_momentEnds{0}; // by what its pictures show
     std::uint64_t m_treeRevision = 0;
     std::vector<ApplicationWindow> m_applicationWindows;
     bool m_processEnded = false;

@@ -84,6 +84,10 @@ std::shared_ptr<const CursorImage> X11WindowServer::GetCursor() const {
     return m_hub->Cursor();
 }
 
+std::uint64_t X11WindowServer::GetMoment() const {
+    return m_hub->Moment();
+}
+
 WindowPictureResult X11WindowServer::TakeWindowPicture(const WindowPictureRequest& request) {
     WindowPictureResult result;
     CmCallGuarded("[X11WindowServer::TakeWindowPicture]>>exception: ", [&] {

@@ -3,6 +3,7 @@
 
 #include "platform/window_server.h"
 
+#include <cstdint>
 #include <memory>
 #include <string>
 
@@ -34,6 +35,7 @@ public:
     std::shared_ptr<const ApplicationList> GetApplications() const override;
     bool GetPointerPosition(CGPoint& position) const override;
     std::shared_ptr<const CursorImage> GetCursor() const override;
+    std::uint64_t GetMoment() const override;
     WindowPictureResult TakeWindowPicture(const WindowPictureRequest& request) override;
     DisplayStreamResult OpenDisplayStream(const DisplayStreamRequest& request) override;
     void Rest() override;

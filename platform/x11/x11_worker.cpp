@@ -118,6 +118,7 @@ bool X11Worker::BeginSession() {
             return false;
         m_connection.emplace(std::move(link), m_stops.Get());
         NoteSocket(m_connection->Descriptor());
+        m_ticket = m_hub.moment.End();
         if (!HearArrivals(EPOLL_CTL_ADD, EPOLLIN))
             return false;
         m_connection->SetDeadline(CmSteadyNow() + DEFAULT_CONNECT_DEADLINE);
@@ -151,6 +152,7 @@ void X11Worker::Pause() {
 }
 
 void X11Worker::EndSession() {
+    m_hub.moment.End(); // it looks at the socket
     m_question = {};
     m_asked = false;
     m_failure = nullptr;
@@ -211,14 +213,20 @@ void X11Worker::Serve() {
     RunCommands();
     m_connection->SetDeadline(CmSteadyNow() + PATIENCE);
     m_session->DoDue();
-    m_session->CatchUp(std::exchange(m_isReadable, false) ? EventsFrom::Socket : EventsFrom::Answers);
-    m_connection->Flush();
+    CatchUp(std::exchange(m_isReadable, false) ? EventsFrom::Socket : EventsFrom::Answers);
     Wait();
+}
+
+void X11Worker::CatchUp(EventsFrom from) {
+    m_session->CatchUp(from);
+    m_connection->Flush();
+    m_session->NoteLateEvents();
 }
 
 /// Asks one thing, and nothing more until it is answered: what a server that is stopped doesn't take in has
 /// no room in the socket.
 void X11Worker::ServeStalled() {
+    m_session->EndMoment();
     if (!m_asked) {
         m_question = m_connection->Ask<xcb_get_input_focus_reply_t>(xcb_get_input_focus(m_connection->Get()));
         m_asked = true;
@@ -275,6 +283,7 @@ bool X11Worker::Perform(const X11Hub::Work& work, Nanoseconds deadline) {
     } catch (const Unanswered&) {
         throw;
     } catch (const std::exception& error) {
+        m_session->EndMoment();
         CmTraceError("[X11Worker::Perform]>>exception: ", error.what());
         return false;
     }
@@ -285,16 +294,18 @@ bool X11Worker::Perform(const X11Hub::Work& work, Nanoseconds deadline) {
 /// The thread sleeps meanwhile, and what it would do after the work is done here.
 Borrowing X11Worker::RunForBorrower(Nanoseconds deadline, const X11Hub::Work& work) {
     Borrowing borrowing;
+    const StandingMoment::Ticket ticket = m_hub.moment.End();
     const std::uint64_t events = m_session->EventsSoFar();
     try {
         if (!HearArrivals(EPOLL_CTL_MOD, 0))
             CmTraceWarning("[X11Worker::RunForBorrower]>>can't be undisturbed");
         if (Perform(work, deadline))
             borrowing.outcome = PictureOutcome::Ok;
-        m_session->CatchUp(EventsFrom::Answers);
-        m_connection->Flush();
+        CatchUp(EventsFrom::Answers);
         borrowing.isToBeSeenTo = HasMoreToDo(events);
+        LetMomentStand(ticket);
     } catch (const Unanswered&) {
+        m_session->EndMoment();
         if (borrowing.outcome != PictureOutcome::Ok)
             borrowing.outcome = GetStopFlag() ? PictureOutcome::Lost : PictureOutcome::Timeout;
         borrowing.isUnanswered = !GetStopFlag();
@@ -309,6 +320,11 @@ Borrowing X11Worker::RunForBorrower(Nanoseconds deadline, const X11Hub::Work& wo
         borrowing.isToBeSeenTo = true;
     }
     return borrowing;
+}
+
+/// Whoever does so lets go of the connection now.
+void X11Worker::LetMomentStand(StandingMoment::Ticket ticket) {
+    m_hub.moment.Stand(ticket, m_session->Moment(), m_connection->Descriptor());
 }
 
 /// Something is due before the thread wakes up, or it has other things to wait on.
@@ -331,9 +347,11 @@ void X11Worker::Wait() {
     for (const int descriptor : m_waitedOn)
         waits.push_back({descriptor, POLLIN, 0});
     m_wakeTime = m_session->NextDue().value_or(Nanoseconds::max());
+    LetMomentStand(m_ticket);
     m_hub.Lend(*this);
     WaitFor(waits, longest);
     m_hub.TakeBack();
+    m_ticket = m_hub.moment.End();
     if (m_failure)
         std::rethrow_exception(std::exchange(m_failure, nullptr));
     if (std::any_of(waits.begin() + ofSession, waits.end(),

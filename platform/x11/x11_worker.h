@@ -56,6 +56,8 @@ private:
     void RunCommands();
     void RunCommand(const CommandPtr& command);
     bool Perform(const X11Hub::Work& work, Nanoseconds deadline);
+    void CatchUp(EventsFrom from);
+    void LetMomentStand(StandingMoment::Ticket ticket);
     bool HasMoreToDo(std::uint64_t eventsBefore) const;
     void Wait();
     void WaitForServer(short events);
@@ -84,10 +86,11 @@ private:
     Milliseconds m_backOff;
     Pending<xcb_get_input_focus_reply_t> m_question; // whether a stalled server answers
     bool m_asked = false;
-    Nanoseconds m_wakeTime{0};    // until when it sleeps
-    std::vector<int> m_waitedOn;  // what of the session's it sleeps on
-    std::exception_ptr m_failure; // of a borrower, for the thread to see to
-    bool m_isReadable = false;    // the connection has something that nobody has read
+    StandingMoment::Ticket m_ticket = 0; // since nobody has borrowed the connection
+    Nanoseconds m_wakeTime{0};           // until when it sleeps
+    std::vector<int> m_waitedOn;         // what of the session's it sleeps on
+    std::exception_ptr m_failure;        // of a borrower, for the thread to see to
+    bool m_isReadable = false;           // the connection has something that nobody has read
     View m_view;
     bool m_publishes = false; // not before all of a new session is there
 

@@ -67,7 +67,8 @@ public:
         request.windows = std::move(windows);
         request.rect = rect;
         m_connection.SetDeadline(CmSteadyNow() + PATIENCE);
-        return m_storages.Take(request, m_tree, {}, [this] { CatchUp(); });
+        platform::x11::TakenPicture taken = m_storages.Take(request, m_tree, {}, [this] { CatchUp(); });
+        return {taken.outcome, std::move(taken.picture)};
     }
 
     /// The only layer of a picture; an empty one when there is none.
