@@ -23,15 +23,17 @@ StandingMoment::Ticket StandingMoment::End() {
     const std::lock_guard<std::mutex> lock(m_mutex);
     m_span = {};
     m_socket = -1;
+    m_arrivals = nullptr;
     return ++m_ends;
 }
 
-void StandingMoment::Stand(Ticket ticket, const MomentSpan& span, int socket) {
+void StandingMoment::Stand(Ticket ticket, const MomentSpan& span, int socket, Arrivals& arrivals) {
     const std::lock_guard<std::mutex> lock(m_mutex);
     if (ticket != m_ends)
         return;
     m_span = span;
     m_socket = socket;
+    m_arrivals = &arrivals;
 }
 
 std::uint64_t StandingMoment::Get() noexcept {
@@ -41,7 +43,10 @@ std::uint64_t StandingMoment::Get() noexcept {
     const ICmClock& clock = CmCurrentClock();
     // Nobody may close the socket meanwhile: he would have to end the moment first.
     const bool stands = clock.RunsByItself() && clock.SteadyNow() < m_span.end && IsSilent(m_socket);
-    return stands ? m_span.moment : 0;
+    if (!stands)
+        return 0;
+    m_arrivals->NoteUse();
+    return m_span.moment;
 }
 
 } // namespace platform::x11

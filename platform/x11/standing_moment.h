@@ -1,6 +1,8 @@
 // SPDX-License-Identifier: Apache-2.0
 #pragma once
 
+#include "platform/x11/arrivals.h"
+
 #include <chrono>
 #include <cstdint>
 #include <mutex>
@@ -27,10 +29,11 @@ public:
 
     /// From now on none stands. The ticket is good for Stand until somebody else ends it.
     Ticket End();
-    /// `socket` is the connection's; it stays open until the moment is ended. Nothing stands with a ticket of
-    /// before the last end.
-    void Stand(Ticket ticket, const MomentSpan& span, int socket);
-    /// 0 when none stands, or something has come meanwhile. Never waits, and reads nothing.
+    /// `socket` is the connection's, and `arrivals` are what comes over it, which nobody else touches until
+    /// the moment is ended; nor is the socket closed. Nothing stands with a ticket of before the last end.
+    void Stand(Ticket ticket, const MomentSpan& span, int socket, Arrivals& arrivals);
+    /// 0 when none stands, or something has come meanwhile. Never waits, and reads nothing. Counts as a use
+    /// of the connection otherwise.
     std::uint64_t Get() noexcept;
 
 private:
@@ -38,6 +41,7 @@ private:
     Ticket m_ends = 0;
     MomentSpan m_span;
     int m_socket = -1;
+    Arrivals* m_arrivals = nullptr;
 };
 
 } // namespace platform::x11

@@ -6,7 +6,6 @@
 #include "util/cm_guarded_call.h"
 #include "util/cm_trace.h"
 
-#include <sys/epoll.h>
 #include <sys/eventfd.h>
 #include <sys/socket.h>
 
@@ -67,7 +66,6 @@ X11Worker::X11Worker(HubState& hub, const std::string& display)
       m_display(display),
       m_stops(NewEvents()),
       m_wakes(NewEvents()),
-      m_arrivals(epoll_create1(EPOLL_CLOEXEC)),
       m_backOff(FIRST_BACK_OFF) {}
 
 void X11Worker::End() {
@@ -119,7 +117,7 @@ bool X11Worker::BeginSession() {
         m_connection.emplace(std::move(link), m_stops.Get());
         NoteSocket(m_connection->Descriptor());
         m_ticket = m_hub.moment.End();
-        if (!HearArrivals(EPOLL_CTL_ADD, EPOLLIN))
+        if (!m_arrivals.Open(m_connection->Descriptor()))
             return false;
         m_connection->SetDeadline(CmSteadyNow() + DEFAULT_CONNECT_DEADLINE);
         m_connection->Introduce();
@@ -158,15 +156,8 @@ void X11Worker::EndSession() {
     m_failure = nullptr;
     m_session.reset();
     NoteSocket(-1);
-    if (m_connection)
-        HearArrivals(EPOLL_CTL_DEL, 0); // a forked child may still have the socket open
+    m_arrivals.Close();
     m_connection.reset();
-}
-
-bool X11Worker::HearArrivals(int operation, std::uint32_t events) {
-    epoll_event event{};
-    event.events = events;
-    return epoll_ctl(m_arrivals.Get(), operation, m_connection->Descriptor(), &event) == 0;
 }
 
 void X11Worker::NoteSocket(int socket) {
@@ -297,13 +288,12 @@ Borrowing X11Worker::RunForBorrower(Nanoseconds deadline, const X11Hub::Work& wo
     const StandingMoment::Ticket ticket = m_hub.moment.End();
     const std::uint64_t events = m_session->EventsSoFar();
     try {
-        if (!HearArrivals(EPOLL_CTL_MOD, 0))
+        if (!m_arrivals.BeginUse())
             CmTraceWarning("[X11Worker::RunForBorrower]>>can't be undisturbed");
         if (Perform(work, deadline))
             borrowing.outcome = PictureOutcome::Ok;
         CatchUp(EventsFrom::Answers);
         borrowing.isToBeSeenTo = HasMoreToDo(events);
-        LetMomentStand(ticket);
     } catch (const Unanswered&) {
         m_session->EndMoment();
         if (borrowing.outcome != PictureOutcome::Ok)
@@ -315,16 +305,18 @@ Borrowing X11Worker::RunForBorrower(Nanoseconds deadline, const X11Hub::Work& wo
         m_failure = std::current_exception();
         borrowing.isToBeSeenTo = true;
     }
-    if (!HearArrivals(EPOLL_CTL_MOD, EPOLLIN)) {
+    if (!m_arrivals.EndUse()) {
         m_failure = std::make_exception_ptr(Lost());
         borrowing.isToBeSeenTo = true;
     }
+    if (borrowing.outcome == PictureOutcome::Ok && !m_failure)
+        LetMomentStand(ticket);
     return borrowing;
 }
 
 /// Whoever does so lets go of the connection now.
 void X11Worker::LetMomentStand(StandingMoment::Ticket ticket) {
-    m_hub.moment.Stand(ticket, m_session->Moment(), m_connection->Descriptor());
+    m_hub.moment.Stand(ticket, m_session->Moment(), m_connection->Descriptor(), m_arrivals);
 }
 
 /// Something is due before the thread wakes up, or it has other things to wait on.
@@ -341,7 +333,7 @@ void X11Worker::Wait() {
     if (longest <= Nanoseconds::zero())
         return;
     std::vector<pollfd> waits = ServerWaits(POLLIN);
-    waits[0].fd = m_arrivals.Get();
+    waits[0].fd = m_arrivals.Descriptor();
     const auto ofSession = static_cast<std::ptrdiff_t>(waits.size());
     m_waitedOn = m_session->Descriptors();
     for (const int descriptor : m_waitedOn)
@@ -352,6 +344,8 @@ void X11Worker::Wait() {
     WaitFor(waits, longest);
     m_hub.TakeBack();
     m_ticket = m_hub.moment.End();
+    if (m_isReadable && !m_arrivals.Listen())
+        throw Lost();
     if (m_failure)
         std::rethrow_exception(std::exchange(m_failure, nullptr));
     if (std::any_of(waits.begin() + ofSession, waits.end(),

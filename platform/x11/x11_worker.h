@@ -1,6 +1,7 @@
 // SPDX-License-Identifier: Apache-2.0
 #pragma once
 
+#include "platform/x11/arrivals.h"
 #include "platform/x11/owned_descriptor.h"
 #include "platform/x11/x11_hub_state.h"
 #include "platform/x11/x11_session.h"
@@ -47,7 +48,6 @@ private:
     void EndSession();
     void Lose();
     void NoteSocket(int socket);
-    bool HearArrivals(int operation, std::uint32_t events);
 
     // Serving.
     void ServeGuarded();
@@ -78,8 +78,7 @@ private:
     const std::string m_display;
     const OwnedDescriptor m_stops; // readable when the thread is to end
     const OwnedDescriptor m_wakes; // readable when the hub has something for it
-    /// Readable when the connection is, but not while somebody has borrowed it.
-    const OwnedDescriptor m_arrivals;
+    Arrivals m_arrivals;
     std::optional<X11Connection> m_connection;
     std::optional<X11Session> m_session;
     bool m_lossUntold = false;

@@ -9,12 +9,32 @@
 
 #include <gtest/gtest.h>
 
+#include <pthread.h>
+
+#include <csignal>
 #include <cstdint>
 #include <memory>
 #include <optional>
 #include <string>
 #include <utility>
 #include <vector>
+
+/// What threads of the library's own are like: a connection that breaks under them doesn't end the process.
+class CBrokenPipeBlocked {
+public:
+    CBrokenPipeBlocked() {
+        sigset_t pipe;
+        sigemptyset(&pipe);
+        sigaddset(&pipe, SIGPIPE);
+        pthread_sigmask(SIG_BLOCK, &pipe, &m_former);
+    }
+    ~CBrokenPipeBlocked() { pthread_sigmask(SIG_SETMASK, &m_former, nullptr); }
+    CBrokenPipeBlocked(const CBrokenPipeBlocked&) = delete;
+    CBrokenPipeBlocked& operator=(const CBrokenPipeBlocked&) = delete;
+
+private:
+    sigset_t m_former{};
+};
 
 /// An X server with one application on it, and the window server that is tested.
 class X11Test : public testing::Test {

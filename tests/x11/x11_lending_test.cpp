@@ -3,11 +3,9 @@
 #include "tests/support/test_effort.h"
 #include "tests/x11/x11_fixture.h"
 
-#include <pthread.h>
-
+#include <algorithm>
 #include <atomic>
 #include <chrono>
-#include <csignal>
 #include <fstream>
 #include <list>
 #include <string>
@@ -17,23 +15,6 @@ namespace {
 
 using namespace platform;
 using namespace std::chrono_literals;
-
-/// What threads of the library's own are like: a connection that breaks under them doesn't end the process.
-class CBrokenPipeBlocked {
-public:
-    CBrokenPipeBlocked() {
-        sigset_t pipe;
-        sigemptyset(&pipe);
-        sigaddset(&pipe, SIGPIPE);
-        pthread_sigmask(SIG_BLOCK, &pipe, &m_former);
-    }
-    ~CBrokenPipeBlocked() { pthread_sigmask(SIG_SETMASK, &m_former, nullptr); }
-    CBrokenPipeBlocked(const CBrokenPipeBlocked&) = delete;
-    CBrokenPipeBlocked& operator=(const CBrokenPipeBlocked&) = delete;
-
-private:
-    sigset_t m_former{};
-};
 
 /// How often a thread of this process with that name has gone to sleep.
 long SleepsOf(const std::string& name) {
@@ -86,6 +67,30 @@ TEST_F(X11Lending, LeavesTheServersThreadAsleep) {
     for (int i = 0; i < 50; ++i)
         EXPECT_EQ(TakeFor(PATIENCE), PictureOutcome::Ok);
     EXPECT_LT(SleepsOf("scn-x11") - before, 10);
+}
+
+TEST_F(X11Lending, LeavesItAsleepWhileWindowsPaintToo) {
+    if (!Begin())
+        return;
+    const CGWindowID window = Add("w", "10 10 200 100 00ff00");
+    const CBrokenPipeBlocked blocked;
+    ASSERT_NE(TakeWhenShown(window, GREEN), nullptr);
+    // A machine that is too busy may let the lease end.
+    EXPECT_TRUE(ComesTrue([&] {
+        const long before = SleepsOf("scn-x11");
+        for (int i = 0; i < 40; ++i) {
+            EXPECT_TRUE(Application().Tell("recolour w " + std::string(i % 2 == 0 ? "0000ff" : "00ff00")));
+            EXPECT_EQ(TakeFor(PATIENCE), PictureOutcome::Ok);
+        }
+        return SleepsOf("scn-x11") - before < 10;
+    }));
+    // Once nobody looks any more, it does.
+    ASSERT_TRUE(Application().Create("more", "50 50 70 70 0000ff"));
+    EXPECT_TRUE(ComesTrue([&] {
+        const auto windows = Server().GetWindows();
+        return std::any_of(windows->Windows().begin(), windows->Windows().end(),
+                           [](const WindowInfo& each) { return each.frame.size.width == 70; });
+    }));
 }
 
 TEST_F(X11Lending, KeepsTheViewTrue) {

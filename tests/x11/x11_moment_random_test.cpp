@@ -216,7 +216,7 @@ private:
     std::vector<xcb_window_t> m_windows;
 };
 
-TEST(X11MomentRandom, SaysThatAPictureHoldsOnlyWhereItDoes) {
+void JudgeHistory() {
     if (const auto missing = MissingProgram(XServer::ProgramsOf(XServerOptions::Kind::Xvfb)))
         GTEST_SKIP() << *missing;
     const unsigned seed = std::random_device{}();
@@ -241,6 +241,15 @@ TEST(X11MomentRandom, SaysThatAPictureHoldsOnlyWhereItDoes) {
     }
     std::cout << "seed " << seed << ", pictures that held: " << stood << " of " << told << " with a moment\n";
     EXPECT_GT(stood, rounds / 40);
+}
+
+TEST(X11MomentRandom, SaysThatAPictureHoldsOnlyWhereItDoes) {
+    JudgeHistory();
+}
+
+TEST(X11MomentRandom, SaysSoToThoseWhoBorrowTheConnection) {
+    const CBrokenPipeBlocked blocked;
+    JudgeHistory();
 }
 
 } // namespace
