@@ -24,6 +24,9 @@ endif()
 # Trace lines name their source place from the project root, on whatever machine they were built.
 add_compile_options(-ffile-prefix-map=${PROJECT_SOURCE_DIR}/=)
 
+# The linker places some functions by name (src/tick_functions.ld).
+add_compile_options(-ffunction-sections)
+
 if(SCREENSHARE_SANITIZE STREQUAL "address")
     set(sanitizer_options -fsanitize=address,undefined,float-cast-overflow -fno-sanitize-recover=all)
 elseif(SCREENSHARE_SANITIZE STREQUAL "thread")
