@@ -21,6 +21,11 @@ namespace {
 constexpr unsigned MOST_REPORTS = 256;
 /// Of more rectangles of damage than that, some are told by what lies around them.
 constexpr std::size_t MOST_RECTANGLES = 64;
+/// Pixels are asked for ahead when they have no more bytes than that: few are wasted where they are the wrong
+/// ones.
+constexpr std::size_t MOST_BYTES_AHEAD = std::size_t{64} << 10U;
+/// How far beside what was damaged last; letters come one after the other.
+constexpr int LETTERS_WIDE = 32;
 /// Set when another rectangle of the same report follows.
 constexpr std::uint8_t MORE_FOLLOW = 0x80;
 
@@ -148,6 +153,7 @@ void WindowStorage::OnGone() {
 void WindowStorage::Void() {
     ForgetPixmap();
     ForgetPixels();
+    m_likely = {};
     ++m_renewals;
 }
 
@@ -290,11 +296,45 @@ void WindowStorage::CountChanges() {
 }
 
 void WindowStorage::AskForDamage(xcb_xfixes_region_t parts) {
+    // What is damaged now may be painted since.
+    DropAhead();
     m_questions.reserve(m_questions.size() + 1); // once it is asked, the answer must not be missed
     m_changes.CountFrom(xcb_damage_subtract(m_connection.Get(), m_changes.Get(), 0, parts).sequence);
     m_questions.push_back(m_connection.Ask<xcb_xfixes_fetch_region_reply_t>(
         xcb_xfixes_fetch_region(m_connection.Get(), parts)));
     m_changed = false;
+}
+
+void WindowStorage::AskAheadForPixels(SharedPixelsPool& pool) {
+    const int width = m_likely.right - m_likely.left;
+    const int height = m_likely.bottom - m_likely.top;
+    if (width <= 0 || height <= 0 || !m_pixels.IsOf(m_width, m_height, m_pixels.pixels))
+        return;
+    const std::size_t bytes = m_pixels.pixels.BytesPerRow(width) * static_cast<std::size_t>(height);
+    std::shared_ptr<SharedPixels> block = bytes <= MOST_BYTES_AHEAD ? pool.Take(bytes) : nullptr;
+    if (block == nullptr)
+        return;
+    RowsRead read = RowsRead::Ask(m_connection, Pixmap(), m_likely.left, m_likely.top, width, m_likely.bottom,
+                                  *block, 0, m_pixels.pixels.BytesPerPixel());
+    m_ahead.emplace(PixelsAhead{m_likely, std::move(block), std::move(read)});
+}
+
+std::optional<PixelsAhead> WindowStorage::TakeAhead() {
+    PixelRegion beyond = m_damage;
+    if (m_ahead)
+        beyond.Subtract(m_ahead->rect);
+    if (!m_ahead || m_damage.IsEmpty() || !beyond.IsEmpty()) {
+        DropAhead();
+        return std::nullopt;
+    }
+    return std::exchange(m_ahead, std::nullopt);
+}
+
+/// The answer is mostly here: then the memory can be used again. Without it the server may still write there.
+void WindowStorage::DropAhead() {
+    std::optional<PixelsAhead> ahead = std::exchange(m_ahead, std::nullopt);
+    if (ahead)
+        ahead->read.Finish(m_connection);
 }
 
 bool WindowStorage::AwaitDamage() {
@@ -322,6 +362,9 @@ void WindowStorage::AddDamage(const xcb_xfixes_fetch_region_reply_t& answer) {
     for (const PixelRect& rect : FewerRects(rects, MOST_RECTANGLES))
         m_damage.Add(rect);
     m_damage.Intersect(all);
+    const PixelRect around = m_damage.Bounds();
+    m_likely = {std::max(around.left - LETTERS_WIDE, 0), around.top,
+                std::min(around.right + LETTERS_WIDE, m_width), around.bottom};
 }
 
 /// Until they are given back there are none, and nothing is known to be damaged.
@@ -337,6 +380,7 @@ StoredPixels WindowStorage::TakePixels() {
 void WindowStorage::ForgetPixels() {
     m_pixels = StoredPixels();
     m_questions.clear();
+    m_ahead.reset();
     m_damage.Clear();
 }
 

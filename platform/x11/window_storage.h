@@ -41,6 +41,13 @@ std::shared_ptr<Picture> PictureOf(const ServerPixels& pixels, const std::shared
                                    int width, const PixelRect& visible, const PixelRegion& shown,
                                    const CGRect& rect);
 
+/// Pixels that are asked for before it is known where a storage was damaged.
+struct PixelsAhead {
+    PixelRect rect;
+    std::shared_ptr<SharedPixels> block; ///< Takes them from its beginning, without gaps.
+    RowsRead read;
+};
+
 /// A watch for changes or paintings of a window: a Damage object in the server.
 /// Threads: the X thread.
 class DamageWatch {
@@ -127,6 +134,15 @@ public:
     void CountChanges();
     /// The same, and asks by way of `parts` for what was damaged so far.
     void AskForDamage(xcb_xfixes_region_t parts);
+    /// Right behind that, asks as well for the pixels of where it is likely to be, near what was damaged
+    /// last: who types goes on there. If it is, the answer needs no second question.
+    void AskAheadForPixels(SharedPixelsPool& pool);
+    /// Those that were asked for behind the last question for damage, if there is some and only there; that
+    /// has to be answered. They are as true as if they had been asked for now: what was painted after the
+    /// question will be told later in both cases.
+    std::optional<PixelsAhead> TakeAhead();
+    /// Nobody wants them any more.
+    void DropAhead();
     /// It has changed, and what of it would be all that is to be fetched; nobody has asked yet.
     bool IsDamageWorthAsking() const { return m_changed && m_pixels.block != nullptr && m_questions.empty(); }
     /// False when it can't be had.
@@ -188,6 +204,8 @@ private:
     bool m_changed = true;
     std::vector<Pending<xcb_xfixes_fetch_region_reply_t>> m_questions; // in their order
     PixelRegion m_damage;
+    PixelRect m_likely; // to be damaged next; empty for nothing
+    std::optional<PixelsAhead> m_ahead;
     DamageWatch m_paintings; // while not all is proven
     unsigned m_reports = 0;
     Nanoseconds m_watchedSince{0};

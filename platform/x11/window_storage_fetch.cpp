@@ -35,6 +35,7 @@ void StorageFetch::Ask() {
 
 void StorageFetch::AskForAll() {
     WindowStorage& storage = *m_storage;
+    storage.DropAhead();
     storage.TakePixels();
     storage.CountChanges();
     m_result = {nullptr, storage.Width(), storage.Height(), m_pixels, storage.Proof().Unproven()};
@@ -55,16 +56,31 @@ void StorageFetch::AskForPixels() {
         m_failed = true;
         return;
     }
-    if (m_storage->Damage().IsEmpty())
-        return;
     m_damage = m_storage->Damage();
-    Plan(m_damage);
+    const bool areHere = TakeAhead();
+    if (m_damage.IsEmpty())
+        return;
+    if (!areHere)
+        Plan(m_damage);
     m_result = m_storage->TakePixels();
     m_failed = !TakeMemory();
-    if (m_failed)
+    if (m_failed || areHere)
         return;
     for (Piece& piece : m_pieces)
         AskFor(piece);
+}
+
+/// True when all that was damaged has been asked for already.
+bool StorageFetch::TakeAhead() {
+    std::optional<PixelsAhead> ahead = m_storage->TakeAhead();
+    if (!ahead)
+        return false;
+    const PixelRect& rect = ahead->rect;
+    m_bytesAskedFor +=
+        m_pixels.BytesPerRow(rect.right - rect.left) * static_cast<std::size_t>(rect.bottom - rect.top);
+    m_narrow = std::move(ahead->block);
+    m_pieces.push_back({rect, false, 0, std::move(ahead->read)});
+    return true;
 }
 
 void StorageFetch::Plan(const PixelRegion& damage) {

@@ -50,6 +50,7 @@ private:
     };
 
     void AskForAll();
+    bool TakeAhead();
     /// Pieces that cover the damage, from top to bottom.
     void Plan(const PixelRegion& damage);
     bool TakeMemory();

@@ -269,8 +269,10 @@ TakenPicture WindowStorages::Taking::Result() {
 
 void WindowStorages::AskAhead() {
     for (const auto& [window, storage] : m_state->storages) {
-        if (storage->IsDamageWorthAsking())
-            storage->AskForDamage(m_state->Tools().parts);
+        if (!storage->IsDamageWorthAsking())
+            continue;
+        storage->AskForDamage(m_state->Tools().parts);
+        storage->AskAheadForPixels(m_state->pool);
     }
 }
 

@@ -12,6 +12,7 @@ using namespace std::chrono_literals;
 
 constexpr std::uint32_t GREEN = 0xFF00FF00;
 constexpr std::uint32_t BLUE = 0xFF0000FF;
+constexpr std::uint32_t RED = 0xFFFF0000;
 constexpr PixelRect PLACE{40, 30, 240, 130};
 constexpr int AREA = 200 * 100;
 
@@ -49,6 +50,69 @@ TEST(WindowStorages, GiveTheSamePictureOfAWindowThatWasMoved) {
     const PictureLayer moved = bench.TakeLayer(window);
     EXPECT_EQ(moved.picture, first);
     EXPECT_EQ(moved.frame.origin, (CGPoint{100, 90}));
+}
+
+/// Where somebody writes: the second letter is asked for before it is known where it is.
+class Letters {
+public:
+    Letters() {
+        bench.Begin();
+        window = bench.Show(PLACE);
+        EXPECT_TRUE(IsAll(bench.TakeOne(window), GREEN));
+        Write(0x0000FF, 20);
+        EXPECT_EQ(CountOf(*bench.TakeOne(window), BLUE), 8 * 10);
+    }
+
+    void Write(std::uint32_t colour, int x) {
+        bench.Fill(window, colour, {x, 30, x + 8, 40});
+        bench.Settle();
+    }
+    void AskAhead() {
+        bench.Storages().AskAhead();
+        bench.Connection().RoundTrip();
+    }
+
+    StoragesBench bench;
+    xcb_window_t window = 0;
+};
+
+TEST(WindowStorages, FetchWhatIsWrittenBesideTheLastLetterWithTheQuestionForDamage) {
+    Letters letters;
+    letters.Write(0xFF0000, 28);
+    letters.AskAhead();
+    const unsigned before = xcb_no_operation(letters.bench.Connection().Get()).sequence;
+    const PicturePtr picture = letters.bench.TakeOne(letters.window);
+    EXPECT_EQ(xcb_no_operation(letters.bench.Connection().Get()).sequence, before + 1) << "it asked again";
+    EXPECT_EQ(CountOf(*picture, RED), 8 * 10);
+    EXPECT_EQ(CountOf(*picture, BLUE), 8 * 10);
+    EXPECT_EQ(CountOf(*picture, GREEN), AREA - 160);
+}
+
+TEST(WindowStorages, FetchAgainWhatIsPaintedAfterItWasAskedForAhead) {
+    Letters letters;
+    letters.Write(0x00FFFF, 28);
+    letters.AskAhead();
+    letters.Write(0xFF0000, 28);
+    EXPECT_EQ(CountOf(*letters.bench.TakeOne(letters.window), RED), 8 * 10);
+}
+
+TEST(WindowStorages, FetchWhatIsWrittenElsewhereThanItWasAskedForAhead) {
+    Letters letters;
+    letters.Write(0xFF0000, 150);
+    letters.AskAhead();
+    const PicturePtr picture = letters.bench.TakeOne(letters.window);
+    EXPECT_EQ(CountOf(*picture, RED), 8 * 10);
+    // The window may be another one by then.
+    letters.Write(0x00FFFF, 150);
+    letters.AskAhead();
+    letters.bench.Resize(letters.window, 60, 50);
+    letters.bench.Settle();
+    EXPECT_TRUE(letters.bench.ComesTrueMeanwhile([&] {
+        letters.bench.Fill(letters.window, 0xFF0000, {0, 0, 60, 50});
+        letters.bench.Settle();
+        letters.bench.Storages().AskAhead();
+        return IsAll(letters.bench.TakeOne(letters.window), RED);
+    }));
 }
 
 TEST(WindowStorages, FetchTheRectanglesThatHaveChangedAndNoOthers) {
