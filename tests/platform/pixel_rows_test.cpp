@@ -4,6 +4,8 @@
 #include "tests/support/test_effort.h"
 
 #include <gtest/gtest.h>
+#include <sys/mman.h>
+#include <unistd.h>
 
 #include <algorithm>
 #include <array>
@@ -149,6 +151,27 @@ TEST_P(PixelRows, AreLaidOverOthersPixelByPixel) {
         DrawRow(from, source.bytes.data(), to, target.data(), count);
         ASSERT_EQ(target, expected) << Named(from, to, count, m_seed);
     }
+}
+
+TEST_P(PixelRows, AreConvertedToTheLastPixelBeforeTheEndOfMemory) {
+    const auto page = static_cast<std::size_t>(sysconf(_SC_PAGESIZE));
+    const std::size_t length = 4 * page;
+    void* const mapped =
+        mmap(nullptr, length + page, PROT_READ | PROT_WRITE, MAP_PRIVATE | MAP_ANONYMOUS, -1, 0);
+    ASSERT_NE(mapped, MAP_FAILED);
+    auto* const memory = static_cast<std::uint8_t*>(mapped);
+    ASSERT_EQ(mprotect(memory + length, page, PROT_NONE), 0);
+    for (const std::size_t count : {511U, 512U, 513U, 527U, 528U, 1920U, 1999U}) {
+        const Row source(m_random, CGPixelLayout::BGRX, count, Content::Noise);
+        Bytes expected(count * 4 + 4, 0x5a); // with the pixel before
+        for (std::size_t at = 0; at < count; ++at)
+            Write(expected, CGPixelLayout::RGBA, at + 1, ColourAt(source.bytes, CGPixelLayout::BGRX, at));
+        std::fill_n(memory, length, std::uint8_t{0x5a});
+        std::uint8_t* const row = memory + length - count * 4;
+        ConvertRow(CGPixelLayout::BGRX, source.bytes.data(), CGPixelLayout::RGBA, row, count);
+        EXPECT_EQ(Bytes(row - 4, memory + length), expected) << count << " pixels, seed " << m_seed;
+    }
+    munmap(mapped, length + page);
 }
 
 INSTANTIATE_TEST_SUITE_P(Registers, PixelRows, testing::Bool(),
