@@ -2,6 +2,7 @@
 #pragma once
 
 #include "util/cm_clock.h"
+#include "util/cm_never_destroyed.h"
 #include "util/cm_thread.h"
 
 #include <gtest/gtest.h>
@@ -9,14 +10,18 @@
 
 #include <pthread.h>
 
+#include <algorithm>
 #include <chrono>
 #include <condition_variable>
 #include <cstddef>
+#include <deque>
 #include <filesystem>
+#include <fstream>
 #include <functional>
 #include <iterator>
 #include <memory>
 #include <mutex>
+#include <sstream>
 #include <string>
 #include <thread>
 #include <utility>
@@ -25,10 +30,12 @@
 /// long.
 inline constexpr std::chrono::seconds PATIENCE{30};
 
-/// Puts a manual clock in force for the length of a scope. Make it before the threads that it is to rule.
+/// Puts a manual clock in force for the length of a scope. Make it before the threads that it is to rule. The
+/// clock itself stays as long as the process: a thread that nobody has to wait for, such as one that finishes
+/// a capture whose owner has gone, may just have looked up which clock is in force.
 class CManualClockScope {
 public:
-    CManualClockScope() : m_former(CmReplaceClock(&m_clock)) {}
+    CManualClockScope() : m_clock(NewClock()), m_former(CmReplaceClock(&m_clock)) {}
     ~CManualClockScope() { CmReplaceClock(m_former); }
     CManualClockScope(const CManualClockScope&) = delete;
     CManualClockScope& operator=(const CManualClockScope&) = delete;
@@ -36,7 +43,12 @@ public:
     CCmManualClock* operator->() { return &m_clock; }
 
 private:
-    CCmManualClock m_clock;
+    static CCmManualClock& NewClock() {
+        static const CCmNeverDestroyed<std::deque<CCmManualClock>> clocks;
+        return clocks->emplace_back();
+    }
+
+    CCmManualClock& m_clock;
     ICmClock* const m_former;
 };
 
@@ -144,13 +156,32 @@ inline bool BringSanitizersThread() {
     return true;
 }
 
+/// Whether a thread is on its way out, or gone: the system lists one that has been joined for a little
+/// longer.
+inline bool IsThreadEnding(const std::filesystem::path& task) {
+    constexpr unsigned long EXITING = 4; // in the flags that the kernel keeps
+    std::ifstream file(task / "stat");
+    const std::string text{std::istreambuf_iterator<char>(file), {}};
+    const std::size_t name = text.rfind(')');
+    if (name == std::string::npos)
+        return true;
+    std::istringstream rest(text.substr(name + 1));
+    std::string field;
+    for (int i = 0; i < 6; ++i) // state, parent, group, session, terminal, its group
+        rest >> field;
+    unsigned long flags = 0;
+    rest >> flags;
+    return (flags & EXITING) != 0;
+}
+
 /// How many threads the operating system counts in this process; a sanitizer's own one is always among them.
 inline std::ptrdiff_t CountThreadsOfProcess() {
     [[maybe_unused]] static const bool brought = BringSanitizersThread();
-    return std::distance(std::filesystem::directory_iterator("/proc/self/task"), {});
+    return std::count_if(std::filesystem::directory_iterator("/proc/self/task"), {},
+                         [](const auto& task) { return !IsThreadEnding(task.path()); });
 }
 
-/// A joined thread may stay in the system's list for a moment. Gives the count that it found last.
+/// A thread that nobody joins takes a moment to end. Gives the count that it found last.
 inline std::ptrdiff_t WaitForThreadsOfProcess(std::ptrdiff_t count) {
     const auto deadline = std::chrono::steady_clock::now() + PATIENCE;
     std::ptrdiff_t found = CountThreadsOfProcess();
