@@ -180,6 +180,7 @@ TEST(SafeLibHandler, IsTheDefaultOneAtFirst) {
 }
 
 TEST(SafeLibHandler, GivesWayToAnotherAndIsRemembered) {
+    safe_lib_set_constraint_handler(nullptr); // whatever another case has left
     EXPECT_EQ(safe_lib_set_constraint_handler(Remember), &safe_lib_default_constraint_handler);
     EXPECT_EQ(current_constraint_handler.load(), &Remember);
     EXPECT_EQ(previous_constraint_handler.load(), &safe_lib_default_constraint_handler);

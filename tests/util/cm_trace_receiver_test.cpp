@@ -3,6 +3,7 @@
 #include "tests/support/sanitizer.h"
 #include "tests/support/test_effort.h"
 #include "tests/support/trace_log.h"
+#include "util/cm_thread.h"
 #include "util/cm_trace.h"
 
 #include <gtest/gtest.h>
@@ -26,7 +27,10 @@ constexpr std::chrono::seconds GENEROUS(30);
 
 class CmTraceReceivers : public testing::Test {
 protected:
-    CmTraceReceivers() { CmSetTraceThreshold(CM_TRACE_DETAIL); }
+    CmTraceReceivers() {
+        ACmThread::JoinEnded(); // of former cases: a sanitizer would miss their threads in a forked process
+        CmSetTraceThreshold(CM_TRACE_DETAIL);
+    }
     ~CmTraceReceivers() override {
         CmSetTraceReceiver(nullptr, nullptr);
         CmSetTraceThreshold(-1);
