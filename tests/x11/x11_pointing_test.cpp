@@ -274,7 +274,8 @@ TEST_F(X11Pointing, IsToldWithThePicturesOfWindows) {
     ASSERT_TRUE(ComesTrue([&] { return platform::CGMainDisplayID() == *side; }));
     Desk().MovePointer({40, 30}); // of the root
     platform::CGPoint asked;
-    ASSERT_TRUE(Desk().Server().GetPointerPosition(asked));
+    // It waits no longer than a tenth of a second for the answer.
+    ASSERT_TRUE(ComesTrue([&] { return Desk().Server().GetPointerPosition(asked); }));
     EXPECT_EQ(asked, (platform::CGPoint{40 - 1280, 30}));
     EXPECT_EQ(toldWithPicture(), asked);
 }
