@@ -27,6 +27,12 @@ inline std::shared_ptr<CScreenCaptureTaskThread> WorkerOf(IShareCaptureEngine& e
     return Reach::Of(dynamic_cast<CShareCaptureEngine&>(engine));
 }
 
+/// Comes back when the pass that an engine may be in, paused or not, is over.
+inline void EndPass(IShareCaptureEngine& engine) {
+    if (const std::shared_ptr<CScreenCaptureTaskThread> worker = WorkerOf(engine))
+        Settle(*worker);
+}
+
 /// A copy of a delivered frame, which lives as long as somebody holds it.
 struct DeliveredShot {
     FrameRef frame = NewFrameRef();

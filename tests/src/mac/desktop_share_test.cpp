@@ -456,6 +456,7 @@ TEST_P(DesktopShare, GivesNoFrameWhilePausedAndSoonAfterwardsOneWithoutWhatIsKep
     EXPECT_TRUE(RunUntilCount(RED, 30 * 20 + 10 * 10));
     EXPECT_EQ(client->Pause(), 0);
     EXPECT_TRUE(client.sink.WaitForNotice("status 3"));
+    EndPass(*client);
     Run(200ms);
     const std::size_t before = client.sink.FrameCount();
     KeepSecrets();

@@ -139,6 +139,7 @@ TEST_P(SessionDesktopShare, ShowsNothingOfWhatWasThereDuringAPause) {
     ASSERT_TRUE(RunUntilRight(MainSize()));
     EXPECT_EQ(client->Pause(), 0);
     EXPECT_TRUE(client.sink.WaitForNotice("status 3"));
+    EndPass(*client);
     CoverWithSecret(Rect(50, 30, 60, 40));
     if (IsSkipped())
         return;
