@@ -33,6 +33,16 @@ inline void EndPass(IShareCaptureEngine& engine) {
         Settle(*worker);
 }
 
+/// Comes back when a started engine's sink has been told what has happened so far.
+inline void EndEvents(IShareCaptureEngine& engine) {
+    struct Reach : CShareCaptureEngine {
+        static std::shared_ptr<ACmThread> AssistantOf(CShareCaptureEngine& other) {
+            return (other.*&Reach::_GetAssistThread)();
+        }
+    };
+    Settle(*Reach::AssistantOf(dynamic_cast<CShareCaptureEngine&>(engine)));
+}
+
 /// A copy of a delivered frame, which lives as long as somebody holds it.
 struct DeliveredShot {
     FrameRef frame = NewFrameRef();

@@ -131,6 +131,7 @@ TEST_P(DesktopShareFallback, GoesToTheDefaultAfterFiveSecondsWithoutAPicture) {
     Tick();
     EXPECT_EQ(client.Statistic().eCaptureMode, GetParam());
     const std::size_t before = client.sink.FrameCount();
+    EndEvents(*client);
     const std::vector<std::string> notices = client.sink.Notices();
     Tick(25); // five seconds
     EXPECT_EQ(client.sink.FrameCount(), before);
@@ -142,6 +143,7 @@ TEST_P(DesktopShareFallback, GoesToTheDefaultAfterFiveSecondsWithoutAPicture) {
     const SHARE_CAPTURE_STATISTIC statistic = client.Statistic();
     EXPECT_EQ(statistic.eCaptureMode, SCREEN_CAPTURER_TYPE_DEFAULT);
     EXPECT_EQ(statistic.nFlags & 2u, 2u);
+    EndEvents(*client);
     EXPECT_EQ(client.sink.Notices(), notices) << "only the statistics tell of it";
     EXPECT_EQ(client.Last().Size(), (TVLSize{100, 60}));
     EXPECT_EQ(client.Last().meta.rectCapture, (TVLRect{200, 0, 300, 60})) << "of the same monitor";
