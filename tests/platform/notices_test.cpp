@@ -5,6 +5,7 @@
 #include "platform/platform_life.h"
 #include "tests/support/call_on_thread.h"
 #include "tests/support/fake_window_server.h"
+#include "tests/support/give_way.h"
 #include "tests/support/notice_fence.h"
 #include "tests/support/test_effort.h"
 #include "tests/support/threads.h"
@@ -407,8 +408,7 @@ TEST_F(Notices, RegistrationsRaceWithNoticesReplacementsAndRests) {
                 Rest();
             }
             Wake();
-            for (auto pause = random() % 2000; pause > 0; --pause)
-                std::this_thread::yield();
+            GiveWay(random() % 2000);
         }
     });
     for (std::thread& thread : threads)

@@ -3,6 +3,7 @@
 
 #include "src/mac/thumbnail_capturer_mac.h"
 #include "tests/src/mac/backend_tools.h"
+#include "tests/support/give_way.h"
 #include "tests/support/test_effort.h"
 #include "tests/support/threads.h"
 
@@ -70,8 +71,7 @@ private:
 class CSlowCapturer final : public CThumbnailCapturerMac {
 public:
     bool captureWindowImage(unsigned window, ImageData& image) override {
-        for (auto pause = m_random() % 60; pause > 0; --pause)
-            std::this_thread::yield();
+        GiveWay(m_random() % 60);
         return CThumbnailCapturerMac::captureWindowImage(window, image);
     }
 

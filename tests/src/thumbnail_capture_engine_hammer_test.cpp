@@ -2,11 +2,13 @@
 #include "src/thumbnail_capture_engine.h"
 
 #include "tests/src/thumbnail_tools.h"
+#include "tests/support/give_way.h"
 #include "tests/support/test_effort.h"
 
 #include <gtest/gtest.h>
 
 #include <atomic>
+#include <chrono>
 #include <iostream>
 #include <memory>
 #include <random>
@@ -22,7 +24,7 @@ constexpr unsigned SEED = 20260;
 
 /// What became of a round; it outlives the callback.
 struct Round {
-    int slowness = 0; ///< How often a call gives way to others.
+    unsigned slowness = 0; ///< How often a call gives way to others.
     std::atomic<bool> isCancelled{false};
     std::atomic<int> entered{0};
     std::atomic<int> calls{0};
@@ -43,8 +45,7 @@ private:
         Round& round = m_round;
         ++round.entered;
         m_weight.assign(m_weight.size(), 2); // what a sanitizer sees when it comes beside the destructor
-        for (int i = round.slowness; i > 0; --i)
-            std::this_thread::yield();
+        GiveWay(round.slowness, std::chrono::milliseconds(10)); // longer than who calls meanwhile
         // Only now: a cancellation that has returned meanwhile has not waited for this call.
         ++(round.isCancelled ? round.lateCalls : round.calls);
         return true;
@@ -120,15 +121,14 @@ Outcome Hammer(int rounds) {
     constexpr int WINDOWS = 4;
     ThumbnailPlan plan;
     std::atomic<int> captures{0};
-    std::atomic<int> slowness{0};                 // how often a capture gives way to others
+    std::atomic<unsigned> slowness{0};            // how often a capture gives way to others
     std::atomic<const Round*> outlasted{nullptr}; // captures last until its cancellation
     plan.capture = [&](unsigned) {
         const Round* const until = outlasted;
         ++captures;
         while (until != nullptr && !until->isCancelled)
             std::this_thread::yield();
-        for (int i = slowness; i > 0; --i)
-            std::this_thread::yield();
+        GiveWay(slowness);
         return true;
     };
     Engine engine(plan);
@@ -143,8 +143,8 @@ Outcome Hammer(int rounds) {
         const bool isOutlasted = i % 2 == 0;
         outlasted = isOutlasted ? &round : nullptr;
         const int before = captures;
-        slowness = static_cast<int>(random() % 300);
-        round.slowness = static_cast<int>(random() % 100);
+        slowness = static_cast<unsigned>(random() % 300);
+        round.slowness = static_cast<unsigned>(random() % 100);
         EXPECT_TRUE(engine.Request({1, 2, 3, WINDOWS}, *callback));
         while (isOutlasted && captures == before)
             std::this_thread::yield();
@@ -153,8 +153,7 @@ Outcome Hammer(int rounds) {
         const bool isIntoCall = i % 4 == 3;
         while (isIntoCall && round.entered == 0)
             std::this_thread::yield();
-        for (auto pause = random() % (isIntoCall ? 10 : 400); pause > 0; --pause)
-            std::this_thread::yield();
+        GiveWay(random() % (isIntoCall ? 10 : 400));
         engine.cancel(callback.get());
         round.isCancelled = true;
         if constexpr (Engine::IS_SOUND)
@@ -202,8 +201,7 @@ TEST(ThumbnailCancelHammer, ServesSeveralClientsAtOnceUntilItIsStopped) {
     const int rounds = TestRounds(60);
     ThumbnailPlan plan;
     plan.capture = [](unsigned id) {
-        for (unsigned i = id * 10; i > 0; --i)
-            std::this_thread::yield();
+        GiveWay(id * 10);
         return id % 2 == 0;
     };
     CSoundEngine engine(plan);
@@ -217,8 +215,7 @@ TEST(ThumbnailCancelHammer, ServesSeveralClientsAtOnceUntilItIsStopped) {
             Round round;
             CMortalCallback callback(round);
             ++(engine.Request({1, 2, 3, 4}, callback) ? taken : refused);
-            for (auto pause = random() % 200; pause > 0; --pause)
-                std::this_thread::yield();
+            GiveWay(random() % 200);
             engine.cancel(&callback);
             round.isCancelled = true;
             std::this_thread::yield();
