@@ -3,6 +3,7 @@
 
 #include "src/share_frame.h"
 #include "tests/support/test_effort.h"
+#include "tests/support/threads.h"
 
 #include <gtest/gtest.h>
 
@@ -26,6 +27,9 @@ namespace {
 constexpr std::size_t CAPACITY = 5;
 constexpr int CAPTURERS = 3;
 constexpr unsigned SEED = 8'128;
+
+/// Fewer pictures shown prove nothing.
+constexpr long FEWEST = 100;
 
 /// What went wrong, and what went on.
 struct Findings {
@@ -86,7 +90,7 @@ public:
 private:
     void Capture(unsigned seed) {
         std::mt19937 random(seed);
-        for (int i = 0; i < m_rounds; ++i) {
+        for (int i = 0; i < m_rounds || GoesOn(); ++i) {
             IShareFrame* const frame = m_queue.popFreeFrame();
             if (frame == nullptr) {
                 std::this_thread::yield();
@@ -98,7 +102,7 @@ private:
             }
             const unsigned start = ++m_now;
             frame->SetTimestamp(start); // by nobody else: a thread checker would tell
-            for (auto wait = random() % 3; wait > 0; --wait)
+            if (random() % 8 == 0)      // seldom: where others compute, it takes as long as they are let
                 std::this_thread::yield();
             const bool fails = random() % 8 == 0;
             const bool isWhole = frame->GetTimestamp() == start;
@@ -113,6 +117,9 @@ private:
         }
         ++m_done;
     }
+
+    /// Whether too little has been shown yet: a busy machine may let the captures be done before.
+    bool GoesOn() const { return findings.shown <= FEWEST && std::chrono::steady_clock::now() < m_deadline; }
 
     void Show() {
         unsigned last = 0;
@@ -146,6 +153,7 @@ private:
     }
 
     const int m_rounds;
+    const std::chrono::steady_clock::time_point m_deadline = std::chrono::steady_clock::now() + PATIENCE;
     Queue m_queue{CAPACITY};
     Owners m_owners{m_queue};
     std::atomic<unsigned> m_now{0};
@@ -211,7 +219,17 @@ std::unique_ptr<Hammer<Queue>> RunHammer(int rounds) {
     return hammer;
 }
 
-constexpr int ROUNDS_FOR_A_FAULT = 20'000;
+/// Whether some hammer finds such a fault, as soon as one does.
+template <class Queue, class Finding>
+bool Finds(Finding Findings::*finding) {
+    constexpr int HAMMERS = 20;
+    constexpr int ROUNDS = 1000;
+    for (int i = 0; i < HAMMERS; ++i) {
+        if (RunHammer<Queue>(ROUNDS)->findings.*finding > 0)
+            return true;
+    }
+    return false;
+}
 
 } // namespace
 
@@ -222,24 +240,24 @@ TEST(FrameQueueHammer, LeavesEachFrameInOnePlaceAndPicturesInOrder) {
     EXPECT_EQ(findings.backwards, 0);
     EXPECT_EQ(findings.strange, 0);
     EXPECT_EQ(findings.lost, 0);
-    EXPECT_GT(findings.shown, 100);
+    EXPECT_GT(findings.shown, FEWEST);
     EXPECT_GT(findings.captures, findings.shown);
 }
 
 TEST(FrameQueueHammer, NoticesAFrameThatTwoHave) {
     if (SCREENSHARE_TEST_SANITIZED != 0)
         GTEST_SKIP() << "it has a race";
-    EXPECT_GT(RunHammer<SharingQueue>(ROUNDS_FOR_A_FAULT)->findings.twoOwners, 0);
+    EXPECT_TRUE(Finds<SharingQueue>(&Findings::twoOwners));
 }
 
 TEST(FrameQueueHammer, NoticesPicturesThatGoBackwards) {
-    EXPECT_GT(RunHammer<DisorderlyQueue>(ROUNDS_FOR_A_FAULT)->findings.backwards, 0);
+    EXPECT_TRUE(Finds<DisorderlyQueue>(&Findings::backwards));
 }
 
 TEST(FrameQueueHammer, NoticesAFrameThatIsLost) {
-    EXPECT_EQ(RunHammer<LosingQueue>(ROUNDS_FOR_A_FAULT)->findings.lost, 1);
+    EXPECT_TRUE(Finds<LosingQueue>(&Findings::lost));
 }
 
 TEST(FrameQueueHammer, NoticesAPictureOfOtherTerms) {
-    EXPECT_GT(RunHammer<CarelessQueue>(ROUNDS_FOR_A_FAULT)->findings.strange, 0);
+    EXPECT_TRUE(Finds<CarelessQueue>(&Findings::strange));
 }
