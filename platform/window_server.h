@@ -95,6 +95,8 @@ struct DisplayInfo {
     float scale = 1.0F;
     /// UTF-8; never empty.
     std::string productName;
+
+    bool operator==(const DisplayInfo&) const = default;
 };
 
 /// The main display first, the others in an order that only changes with the layout.

@@ -230,6 +230,8 @@ void Desk::PublishDisplays() {
     auto displays = std::make_shared<DisplayList>();
     if (m_life.life != Life::Lost)
         *displays = ListDisplays(m_desktop);
+    if (*displays == *m_displays)
+        return;
     const std::vector<Notice> notices = DisplayNotices(*m_displays, *displays);
     m_displays = std::move(displays);
     for (const Notice& notice : notices)

@@ -183,6 +183,21 @@ bool CShareCGSCapturer::captureAgain(IShareFrame& frame) {
     return true;
 }
 
+bool CShareCGSCapturer::captureSameWindows(IShareFrame& frame) {
+    if (m_lastPass == nullptr)
+        return false;
+    Pass pass = *m_lastPass;
+    pass.image = createScreenShot(m_windows.data(), m_windows.size(), m_rectCapturedDisplay, pass.imageRect);
+    if (pass.image == nullptr)
+        return false;
+    pass.hasPlaces = false;
+    pass.pointer.reset();
+    m_bPointerCaptured = false;
+    PutInto(frame, pass);
+    KeepPass(pass);
+    return true;
+}
+
 void CShareCGSCapturer::PutInto(IShareFrame& frame, Pass& pass) {
     auto* const own = dynamic_cast<CShareFrame*>(&frame);
     std::unique_ptr<ShareCompositionNote> before = own != nullptr ? TakeNote(*own) : nullptr;
@@ -389,20 +404,20 @@ bool CShareCGSCapturer::isWindowShared(unsigned window) const {
 int CShareCGSCapturer::createShareImage(const platform::CGRect& rect, platform::CGWindowImageRef& image,
                                         platform::CGRect& outRect) {
     image = nullptr;
-    std::vector<unsigned> windows;
+    m_windows.clear();
     if (isDesktopSharing()) {
         std::vector<int> onScreen;
         getCaptureWindows(onScreen);
-        windows.assign(onScreen.begin(), onScreen.end());
+        m_windows.assign(onScreen.begin(), onScreen.end());
     } else {
         TVLRect box{};
-        m_shareCapturerContext->GetCapturedWindows(windows);
+        m_shareCapturerContext->GetCapturedWindows(m_windows);
         m_shareCapturerContext->GetSharedWindowBoxRect(box);
         outRect = ShareUtilMac::TVLRectToCGRect(box);
     }
-    if (windows.empty())
+    if (m_windows.empty())
         return SHARE_CAPTURE_NO_DATA;
-    image = createScreenShot(windows.data(), windows.size(), rect, outRect);
+    image = createScreenShot(m_windows.data(), m_windows.size(), rect, outRect);
     return image != nullptr ? SHARE_CAPTURE_OK : SHARE_CAPTURE_FAILED;
 }
 

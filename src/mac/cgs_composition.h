@@ -54,6 +54,9 @@ public:
     /// The same picture as the last one, in this frame. False, and the frame as it was, when the window
     /// server may have another by now. The caller answers for all else that it was made from.
     bool captureAgain(IShareFrame& frame);
+    /// A new picture of the same windows at the same places. False, and the frame as it was, without one. The
+    /// caller answers for it that a whole capture would choose these.
+    bool captureSameWindows(IShareFrame& frame);
 
     /// Has the bitmap context lie on that memory, `length` bytes; there is none if that is too short.
     void initCapturerByData(unsigned char* data, unsigned long length, TVLSize size);
@@ -119,6 +122,7 @@ private:
     platform::CGContextRef m_bmpContext; // on m_pFrameData
     unsigned char* m_pFrameData = nullptr;
     platform::CGRect m_rectLastCapture;
+    std::vector<unsigned> m_windows; // of the last picture
     /// Of this pass while it lasts, then any that can be written over.
     std::unique_ptr<ShareCompositionNote> m_note;
     std::unique_ptr<ShareCompositionNote> m_lastDescribed; // has a number

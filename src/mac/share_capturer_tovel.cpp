@@ -1,6 +1,7 @@
 // SPDX-License-Identifier: Apache-2.0
 #include "src/mac/share_capturer_tovel.h"
 
+#include "platform/core_graphics_images.h"
 #include "src/app_share_config.h"
 #include "src/share_util.h"
 #include "util/cm_guarded_call.h"
@@ -29,21 +30,32 @@ unsigned ShareCapturerTovel::captureToIShareFrame(IShareFrame* frame) {
         return static_cast<unsigned>(SHARE_CAPTURE_FAILED);
     int result = SHARE_CAPTURE_FAILED;
     CmCallGuarded("[ShareCapturerTovel::captureToIShareFrame]>>fail>>",
-                  [&] { result = CaptureAgain(*frame) ? SHARE_CAPTURE_OK : CaptureAnew(*frame); });
+                  [&] { result = CaptureShort(*frame) ? SHARE_CAPTURE_OK : CaptureAnew(*frame); });
     return static_cast<unsigned>(result);
 }
 
-/// False when there has to be another picture.
-bool ShareCapturerTovel::CaptureAgain(IShareFrame& frame) {
+/// As far as nothing has changed since the last picture. False when a whole capture has to be made.
+bool ShareCapturerTovel::CaptureShort(IShareFrame& frame) {
     const std::optional<ShareStandingPicture::Terms> terms = TermsInForce();
     if (!terms || !m_standing.IsOf(*terms))
         return false;
-    if (m_standing.IsIn(frame, *terms))
-        return true;
     const std::lock_guard<std::mutex> lock(m_bmpContextLock);
-    if (!m_cgsCapturer->captureAgain(frame))
+    bool isDone = false;
+    if (platform::CGWindowServerGetMoment() == m_standing.Moment())
+        isDone = m_standing.IsIn(frame) || m_cgsCapturer->captureAgain(frame);
+    if (!isDone)
+        isDone = CaptureSameWindows(frame, *terms);
+    if (isDone)
+        frame.SetTimestamp(ShareUtil::GetCaptureFrameTimeStamp());
+    return isDone;
+}
+
+/// Something has been painted, or the pointer has moved; the windows stand where they stood.
+bool ShareCapturerTovel::CaptureSameWindows(IShareFrame& frame, const ShareStandingPicture::Terms& terms) {
+    m_standing.Forget();
+    if (!Context()->DoesLastWalkStand() || !m_cgsCapturer->captureSameWindows(frame))
         return false;
-    frame.SetTimestamp(ShareUtil::GetCaptureFrameTimeStamp());
+    Keep(frame, terms);
     return true;
 }
 
@@ -54,11 +66,16 @@ int ShareCapturerTovel::CaptureAnew(IShareFrame& frame) {
     const std::lock_guard<std::mutex> lock(m_bmpContextLock);
     const std::optional<ShareStandingPicture::Terms> terms = TermsInForce();
     const int result = CaptureWith(*m_cgsCapturer, frame);
-    const std::uint64_t moment = m_cgsCapturer->DrawnMoment();
-    // What the walk went by, before the windows' picture was taken, must be true still.
-    if (result == SHARE_CAPTURE_OK && moment != 0 && terms && Context()->DoesLastWalkStand())
-        m_standing.Keep(frame, *terms, moment);
+    if (result == SHARE_CAPTURE_OK)
+        Keep(frame, terms);
     return result;
+}
+
+/// What the walk went by, before the windows' picture was taken, must be true still.
+void ShareCapturerTovel::Keep(IShareFrame& frame, const std::optional<ShareStandingPicture::Terms>& terms) {
+    const std::uint64_t moment = m_cgsCapturer->DrawnMoment();
+    if (moment != 0 && terms && Context()->DoesLastWalkStand())
+        m_standing.Keep(frame, *terms, moment);
 }
 
 std::optional<ShareStandingPicture::Terms> ShareCapturerTovel::TermsInForce() {

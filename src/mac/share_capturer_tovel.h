@@ -25,8 +25,10 @@ public:
 private:
     /// Nothing while each capture has to be made.
     std::optional<ShareStandingPicture::Terms> TermsInForce();
-    bool CaptureAgain(IShareFrame& frame);
+    bool CaptureShort(IShareFrame& frame);
+    bool CaptureSameWindows(IShareFrame& frame, const ShareStandingPicture::Terms& terms);
     int CaptureAnew(IShareFrame& frame);
+    void Keep(IShareFrame& frame, const std::optional<ShareStandingPicture::Terms>& terms);
 
     std::mutex m_bmpContextLock; // held throughout a picture
     ShareStandingPicture m_standing;

@@ -1,7 +1,6 @@
 // SPDX-License-Identifier: Apache-2.0
 #include "src/mac/share_standing_picture.h"
 
-#include "platform/core_graphics_images.h"
 #include "src/app_share_config.h"
 #include "src/share_capturer_context.h"
 #include "src/share_frame.h"
@@ -30,12 +29,9 @@ std::optional<ShareStandingPicture::Terms> ShareStandingPicture::TermsOf(
     return terms;
 }
 
-bool ShareStandingPicture::IsIn(IShareFrame& frame, const Terms& terms) const {
-    if (!IsOf(terms))
-        return false;
+bool ShareStandingPicture::IsIn(IShareFrame& frame) const {
     auto* const own = dynamic_cast<CShareFrame*>(&frame);
-    if (own == nullptr || !own->AllowsNote() || own->NoteNumber() != m_nNote ||
-        platform::CGWindowServerGetMoment() != m_nMoment)
+    if (own == nullptr || !own->AllowsNote() || own->NoteNumber() != m_nNote)
         return false;
     own->ConfirmNote();
     own->SetMetaInfo(m_meta);

@@ -41,11 +41,12 @@ public:
     /// Nothing while each capture has to be made, for the lines that it traces.
     static std::optional<Terms> TermsOf(const ShareCapturerContext& context);
 
-    /// Whether a frame shows what a capture on these terms would have it show now. It then counts as captured
-    /// anew.
-    bool IsIn(IShareFrame& frame, const Terms& terms) const;
     /// Whether it is of these terms; that leaves the window server.
     bool IsOf(const Terms& terms) const { return m_nMoment != 0 && terms == m_terms; }
+    /// The window server's when it was taken; 0 without a picture.
+    std::uint64_t Moment() const { return m_nMoment; }
+    /// Whether a frame shows it. If so, it counts as captured anew.
+    bool IsIn(IShareFrame& frame) const;
 
     /// A picture was made on these terms, all along, and the frame shows it. `moment` is the window server's.
     void Keep(IShareFrame& frame, const Terms& terms, std::uint64_t moment);

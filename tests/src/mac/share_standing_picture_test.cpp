@@ -252,6 +252,33 @@ TEST_F(StandingPicture, IsOfOneWindowServer) {
     EXPECT_EQ(CountOf(Frame(), 0x00FF00), 0);
 }
 
+TEST_F(StandingPicture, IsFollowedByOneOfTheSameWindowsWithoutAListOfThem) {
+    Rest();
+    desktop->SetContent(WINDOW, SimulatedContent::Colour(0x112233));
+    desktop->SetPointer(CGPoint{70, 60});
+    const unsigned lists = desktop->CallsOf(SimulatedOperation::GetWindows);
+    const unsigned pictures = desktop->CallsOf(SimulatedOperation::TakeWindowPicture);
+    EXPECT_EQ(Capture(), 0u);
+    EXPECT_EQ(desktop->CallsOf(SimulatedOperation::TakeWindowPicture), pictures + 1);
+    EXPECT_EQ(desktop->CallsOf(SimulatedOperation::GetWindows), lists + 2) << "before and behind the picture";
+    EXPECT_EQ(PixelAt(Frame(), 20, 20), Rgb(0x112233));
+    EXPECT_EQ(PixelAt(Frame(), 71, 61), Rgb(0xFFFFFF)) << "the pointer";
+    EXPECT_FALSE(Asks());
+}
+
+TEST_F(StandingPicture, IsFollowedByAWholeCaptureWhenAnotherWindowHasCome) {
+    Rest();
+    SimulatedWindow window = EditorsWindow();
+    window.info.id = WINDOW + 1;
+    window.content = SimulatedContent::Colour(0x445566);
+    desktop->AddWindow(window);
+    clock->Advance(ms(501));
+    Capture();
+    clock->Advance(ms(501));
+    EXPECT_EQ(Capture(), 0u);
+    EXPECT_EQ(PixelAt(Frame(), 20, 20), Rgb(0x445566));
+}
+
 TEST_F(StandingPicture, IsDrawnAgainIntoAFrameThatHasLostIt) {
     Rest();
     const std::array<unsigned char, 4> pixel{1, 2, 3, 4};
