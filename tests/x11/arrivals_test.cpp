@@ -91,10 +91,12 @@ TEST_F(ArrivalsOfSocket, StayUnheardForAsLongAsSomebodyLooks) {
     Send();
     EXPECT_TRUE(AreHeard()) << "nobody has taken what has come";
     Receive();
+    const auto begin = CmSteadyNow();
+    auto last = begin;
+    arrivals.NoteUse();
     Use();
     Send();
-    auto last = CmSteadyNow();
-    for (const auto begin = last; last < begin + 3 * Arrivals::LEASE;) {
+    while (last < begin + 3 * Arrivals::LEASE) {
         const bool areHeard = AreHeard();
         const auto now = CmSteadyNow();
         if (now - last >= Arrivals::LEASE / 2)
