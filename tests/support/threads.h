@@ -160,8 +160,9 @@ inline bool BringSanitizersThread() {
 /// longer.
 inline bool IsThreadEnding(const std::filesystem::path& task) {
     constexpr unsigned long EXITING = 4; // in the flags that the kernel keeps
+    std::string text;                    // empty for one that goes while it is read
     std::ifstream file(task / "stat");
-    const std::string text{std::istreambuf_iterator<char>(file), {}};
+    std::getline(file, text, '\0');
     const std::size_t name = text.rfind(')');
     if (name == std::string::npos)
         return true;
