@@ -102,39 +102,38 @@ static_assert(std::endian::native == std::endian::little,
     std::memcpy(pixels + index * 4, &pixel, 4);
 }
 
-/// How the bytes of pixels are put into another order; of one pixel, or of each of several.
-struct Same {
-    template <class Pixels>
-    [[gnu::always_inline]] static void Turn(Pixels& /*pixels*/) {}
-};
-struct FirstAndThirdSwapped {
-    template <class Pixels>
-    [[gnu::always_inline]] static void Turn(Pixels& pixels) {
-        pixels = (pixels & 0xff00ff00U) | ((pixels >> 16U) & 0xffU) | ((pixels & 0xffU) << 16U);
-    }
-};
-struct Reversed {
-    template <class Pixels>
-    [[gnu::always_inline]] static void Turn(Pixels& pixels) {
-        pixels = (pixels >> 24U) | ((pixels >> 8U) & 0xff00U) | ((pixels & 0xff00U) << 8U) | (pixels << 24U);
-    }
-};
-struct LastToFront {
-    template <class Pixels>
-    [[gnu::always_inline]] static void Turn(Pixels& pixels) {
-        pixels = (pixels << 8U) | (pixels >> 24U);
-    }
-};
-struct FrontToLast {
-    template <class Pixels>
-    [[gnu::always_inline]] static void Turn(Pixels& pixels) {
-        pixels = (pixels >> 8U) | (pixels << 24U);
-    }
-};
-
 /// Pixels that are worked on together, wherever they lie.
 using SomePixels [[gnu::vector_size(32), gnu::aligned(1), gnu::may_alias]] = std::uint32_t;
 constexpr std::size_t SOME = sizeof(SomePixels) / sizeof(std::uint32_t);
+
+/// How the bytes of a pixel are put into another order, and those of several.
+struct Same {
+    static std::uint32_t Turned(std::uint32_t pixel) { return pixel; }
+    [[gnu::always_inline]] static void Turn(SomePixels& /*pixels*/) {}
+};
+struct FirstAndThirdSwapped {
+    static std::uint32_t Turned(std::uint32_t pixel) { return std::rotr(__builtin_bswap32(pixel), 8); }
+    [[gnu::always_inline]] static void Turn(SomePixels& pixels) {
+        const SomePixels halvesSwapped = (pixels >> 16U) | (pixels << 16U);
+        pixels = (pixels & 0xff00ff00U) | (halvesSwapped & 0x00ff00ffU);
+    }
+};
+struct Reversed {
+    static std::uint32_t Turned(std::uint32_t pixel) { return __builtin_bswap32(pixel); }
+    [[gnu::always_inline]] static void Turn(SomePixels& pixels) {
+        const SomePixels halvesSwapped = (pixels >> 16U) | (pixels << 16U);
+        pixels = ((halvesSwapped >> 8U) & 0x00ff00ffU) | ((halvesSwapped & 0x00ff00ffU) << 8U);
+    }
+};
+struct LastToFront {
+    static std::uint32_t Turned(std::uint32_t pixel) { return std::rotl(pixel, 8); }
+    [[gnu::always_inline]] static void Turn(SomePixels& pixels) { pixels = (pixels << 8U) | (pixels >> 24U); }
+};
+struct FrontToLast {
+    static std::uint32_t Turned(std::uint32_t pixel) { return std::rotr(pixel, 8); }
+    [[gnu::always_inline]] static void Turn(SomePixels& pixels) { pixels = (pixels >> 8U) | (pixels << 24U); }
+};
+
 /// What a processor's cache has of memory at once.
 constexpr std::size_t PIXELS_PER_LINE = 2 * SOME;
 /// So far ahead of the writing it is fetched. What is nearer comes too late, what is farther is no better.
@@ -161,11 +160,8 @@ struct TurnLoop {
             return;
         }
         std::size_t done = 0;
-        for (; count >= PIXELS_OF_LONG_ROW && done + PIXELS_PER_LINE <= count; done += PIXELS_PER_LINE) {
-            FetchAhead(target + done * 4);
-            TurnSome(source + done * 4, target + done * 4, set);
-            TurnSome(source + (done + SOME) * 4, target + (done + SOME) * 4, set);
-        }
+        for (; count >= PIXELS_OF_LONG_ROW && done + PIXELS_PER_LINE <= count; done += PIXELS_PER_LINE)
+            TurnLine(source + done * 4, target + done * 4, set);
         for (; done < count; ++done)
             TurnOne(source, target, done, set);
     }
@@ -173,9 +169,15 @@ struct TurnLoop {
 private:
     [[gnu::always_inline]] static void TurnOne(const std::uint8_t* source, std::uint8_t* target,
                                                std::size_t index, std::uint32_t set) {
-        std::uint32_t pixel = ReadPixel(source, index);
-        Order::Turn(pixel);
-        WritePixel(target, index, pixel | set);
+        WritePixel(target, index, Order::Turned(ReadPixel(source, index)) | set);
+    }
+
+    /// One line is asked for at a time: of several at once, the next pixels have to wait for all.
+    [[gnu::always_inline]] static void TurnLine(const std::uint8_t* source, std::uint8_t* target,
+                                                std::uint32_t set) {
+        FetchAhead(target);
+        TurnSome(source, target, set);
+        TurnSome(source + SOME * 4, target + SOME * 4, set);
     }
 
     [[gnu::always_inline]] static void TurnSome(const std::uint8_t* source, std::uint8_t* target,
