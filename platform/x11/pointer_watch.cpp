@@ -134,9 +134,12 @@ bool PointerWatch::Settle() {
     return true;
 }
 
-std::optional<CGPoint> PointerWatch::Position() {
-    const auto reply = m_connection.Fetch<xcb_query_pointer_reply_t>(
+std::optional<CGPoint> PointerWatch::Position(OtherAnswers others) {
+    auto question = m_connection.Ask<xcb_query_pointer_reply_t>(
         xcb_query_pointer(m_connection.Get(), m_connection.Root()));
+    if (others == OtherAnswers::Ahead)
+        m_connection.LetAnswersGather();
+    const auto reply = m_connection.Await(question);
     if (reply == nullptr || reply->same_screen == 0)
         return std::nullopt;
     return CGPoint{static_cast<float>(reply->root_x), static_cast<float>(reply->root_y)};
@@ -144,14 +147,14 @@ std::optional<CGPoint> PointerWatch::Position() {
 
 // ---- Motion
 
-std::optional<CGPoint> PointerWatch::WatchedPosition() {
+std::optional<CGPoint> PointerWatch::WatchedPosition(OtherAnswers others) {
     // What is told between the two requests is looked at later, and taken for news.
     if (!m_isWatched && m_connection.Has().xinput) {
         SelectMotion(MOTIONS);
         m_isWatched = true;
     }
     m_position.reset();
-    m_position = Position();
+    m_position = Position(others);
     return m_position;
 }
 

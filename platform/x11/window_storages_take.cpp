@@ -267,13 +267,16 @@ TakenPicture WindowStorages::Taking::Result() {
     return taken;
 }
 
-void WindowStorages::AskAhead() {
+bool WindowStorages::AskAhead() {
+    bool hasAsked = false;
     for (const auto& [window, storage] : m_state->storages) {
         if (!storage->IsDamageWorthAsking())
             continue;
         storage->AskForDamage(m_state->Tools().parts);
         storage->AskAheadForPixels(m_state->pool);
+        hasAsked = true;
     }
+    return hasAsked;
 }
 
 TakenPicture WindowStorages::Take(const WindowPictureRequest& request, WindowTree& tree,

@@ -17,6 +17,7 @@
 #include <xcb/xinput.h>
 
 #include <algorithm>
+#include <ctime>
 #include <string>
 #include <vector>
 
@@ -104,6 +105,12 @@ void X11Connection::Send() {
 void X11Connection::Flush() {
     if (m_mayHoldRequests)
         Send();
+}
+
+void X11Connection::LetAnswersGather() {
+    constexpr timespec GATHERING{0, 250'000};
+    Flush();
+    nanosleep(&GATHERING, nullptr);
 }
 
 Event X11Connection::NextEvent() {

@@ -151,6 +151,9 @@ public:
     void RoundTrip();
     /// Sends what has been asked for since the last time.
     void Flush();
+    /// The same, and sleeps for a moment, a quarter of a millisecond. A server writes each answer by itself,
+    /// so who waits for several is woken as often; most of the time all of them are there behind this.
+    void LetAnswersGather();
 
     /// Everything that has come, in its order; null when there is nothing more. Reads the socket.
     Event NextEvent();

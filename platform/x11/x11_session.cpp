@@ -324,9 +324,10 @@ std::optional<CGPoint> X11Session::AskForPointer() {
     const Nanoseconds asked = CmSteadyNow();
     m_eventsAnswered = m_events;
     m_lastAnswered.reset();
-    m_storages.AskAhead();
+    const bool hasAsked = m_storages.AskAhead();
     const std::optional<CGPoint> pointerSoFar = m_pointer.PositionSoFar();
-    const std::optional<CGPoint> pointer = m_pointer.WatchedPosition();
+    using enum PointerWatch::OtherAnswers;
+    const std::optional<CGPoint> pointer = m_pointer.WatchedPosition(hasAsked ? Ahead : None);
     if (pointer != pointerSoFar)
         EndMoment();
     if (isTimed)
