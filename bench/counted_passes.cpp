@@ -147,13 +147,15 @@ public:
 /// A pass of an engine that shares a desktop on which a window changes, or none.
 class PassStep final : public Step {
 public:
-    explicit PassStep(platform::CGWindowID changing = 0)
+    /// `tells` is for a window server that tells moments.
+    explicit PassStep(platform::CGWindowID changing = 0, bool tells = false)
         : m_served(DesktopScene()),
           m_changing(changing),
           m_engine(new InlineEngine) {
         m_engine->SelectSharedDisplay(DISPLAY);
         m_engine->SetSink(&m_sink);
         m_engine->BelieveStarted();
+        m_served.Server().TellMoments(tells);
         const bool wide = changing == WIDE_WINDOW;
         for (std::uint32_t seed = 2; seed < 4; ++seed)
             m_contents.push_back(Squares(wide ? WIDTH : 300, wide ? HEIGHT : 20, seed));
@@ -248,6 +250,8 @@ using StepMaker = std::function<std::unique_ptr<Step>()>;
 const std::map<std::string, StepMaker>& Steps() {
     static const std::map<std::string, StepMaker> steps{
         {"pass_static", [] { return std::make_unique<PassStep>(); }},
+        {"pass_standing", [] { return std::make_unique<PassStep>(0, true); }},
+        {"pass_standing_typing", [] { return std::make_unique<PassStep>(SMALL_WINDOW, true); }},
         {"pass_typing", [] { return std::make_unique<PassStep>(SMALL_WINDOW); }},
         {"pass_full", [] { return std::make_unique<PassStep>(WIDE_WINDOW); }},
         {"composition_full", [] { return std::make_unique<CompositionStep>(); }},

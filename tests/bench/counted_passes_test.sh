@@ -12,7 +12,7 @@ check() { # STEP...
     exit
 }
 
-case_passes() { check pass_static pass_typing pass_full; }
+case_passes() { check pass_static pass_standing pass_standing_typing pass_typing pass_full; }
 case_composition() { check composition_full; }
 case_walks() { check walk_10 walk_200 walk_200_moving; }
 
