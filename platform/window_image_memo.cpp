@@ -3,6 +3,7 @@
 #include "platform/window_image_layers.h"
 
 #include <cstddef>
+#include <memory>
 #include <new>
 #include <utility>
 #include <vector>
@@ -10,6 +11,8 @@
 namespace platform {
 
 struct CGWindowImageMemo::Kept {
+    explicit Kept(const CGWindowImage& whole) : image(whole) {}
+
     CGWindowImage image; // its layers have no pictures
     std::vector<std::weak_ptr<const Picture>> pictures;
 };
@@ -24,7 +27,7 @@ void CGWindowImageMemo::Keep(const CGWindowImage* image) noexcept {
         return;
     try {
         if (kept == nullptr)
-            kept.reset(new Kept{*image, {}});
+            kept = std::make_unique<Kept>(*image);
         else
             kept->image = *image;
         kept->pictures.clear();

@@ -4,7 +4,6 @@
 #include "src/app_share_config.h"
 #include "src/share_capturer_context.h"
 #include "src/share_frame.h"
-#include "src/share_util.h"
 #include "util/cm_trace.h"
 
 std::optional<ShareStandingPicture::Terms> ShareStandingPicture::TermsOf(
@@ -35,7 +34,6 @@ bool ShareStandingPicture::IsIn(IShareFrame& frame) const {
         return false;
     own->ConfirmNote();
     own->SetMetaInfo(m_meta);
-    own->SetTimestamp(ShareUtil::GetCaptureFrameTimeStamp());
     return true;
 }
 

@@ -45,7 +45,7 @@ public:
     bool IsOf(const Terms& terms) const { return m_nMoment != 0 && terms == m_terms; }
     /// The window server's when it was taken; 0 without a picture.
     std::uint64_t Moment() const { return m_nMoment; }
-    /// Whether a frame shows it. If so, it counts as captured anew.
+    /// Whether a frame shows it. If so, that counts as a filling of the frame.
     bool IsIn(IShareFrame& frame) const;
 
     /// A picture was made on these terms, all along, and the frame shows it. `moment` is the window server's.

@@ -270,13 +270,13 @@ TEST_P(LifeContract, JoinsItsThreadsWhenItRestsAndGoesOnAfterwards) {
     NEEDS(stream);
     ASSERT_NE(Next(*stream), nullptr);
     Server().Rest();
-    EXPECT_EQ(WaitForThreadsOfProcess(before), before);
+    EXPECT_TRUE(ThreadsComeDownTo(before));
     m_log->Clear();
     NEEDS(m_desk->Recolour(*window, 0x0000FF));
     EXPECT_TRUE(ReadUntil(*stream, {40, 40}, 0x0000FF));
     Server().Rest();
     Server().Rest();
-    EXPECT_EQ(WaitForThreadsOfProcess(before), before);
+    EXPECT_TRUE(ThreadsComeDownTo(before));
 }
 
 TEST_P(LifeContract, BlocksEverySignalOnItsThreads) {

@@ -58,7 +58,7 @@ TEST_F(PlatformLife, NoThreadIsLeftAfterARest) {
     StartAll();
     EXPECT_EQ(CountThreadsOfProcess(), m_threadsBefore + 2);
     Rest();
-    EXPECT_EQ(WaitForThreadsOfProcess(m_threadsBefore), m_threadsBefore);
+    EXPECT_TRUE(ThreadsComeDownTo(m_threadsBefore));
     EXPECT_FALSE(m_server->HasReceiver());
     EXPECT_EQ(m_server->calls.rests, 1);
     RemoveNoticeHandler(LIFE, {1, 1});
@@ -99,7 +99,7 @@ TEST_F(PlatformLife, ARestDeliversWhatWaits) {
 TEST_F(PlatformLife, TheNextCallStartsAnewWhatRegistrationsNeed) {
     StartAll();
     Rest();
-    EXPECT_EQ(WaitForThreadsOfProcess(m_threadsBefore), m_threadsBefore);
+    EXPECT_TRUE(ThreadsComeDownTo(m_threadsBefore));
     CGMainDisplayID();
     EXPECT_TRUE(m_server->HasReceiver());
     m_server->Raise(LifeNotice());
@@ -113,7 +113,7 @@ TEST_F(PlatformLife, WakingStartsNothingForNobody) {
     Rest();
     Wake();
     CGMainDisplayID();
-    EXPECT_EQ(WaitForThreadsOfProcess(m_threadsBefore), m_threadsBefore);
+    EXPECT_TRUE(ThreadsComeDownTo(m_threadsBefore));
     EXPECT_FALSE(m_server->HasReceiver());
 }
 
@@ -168,7 +168,7 @@ TEST_F(PlatformLife, WhatIsCalledDuringARestKeepsNothingAwake) {
         EXPECT_TRUE(blockDone.Reaches(1));
         handlerGate.Open();
     }
-    EXPECT_EQ(WaitForThreadsOfProcess(m_threadsBefore), m_threadsBefore);
+    EXPECT_TRUE(ThreadsComeDownTo(m_threadsBefore));
     EXPECT_FALSE(m_server->HasReceiver());
     RemoveNoticeHandler(LIFE, {1, 1});
 }
@@ -182,7 +182,7 @@ TEST_F(PlatformLife, ARestInsideAHandlerDoesNotWaitAndItsThreadEnds) {
     });
     m_server->Raise(LifeNotice());
     ASSERT_TRUE(rested.Reaches(1));
-    EXPECT_EQ(WaitForThreadsOfProcess(m_threadsBefore), m_threadsBefore);
+    EXPECT_TRUE(ThreadsComeDownTo(m_threadsBefore));
     EXPECT_FALSE(m_server->HasReceiver());
     RemoveNoticeHandler(LIFE, {1, 1});
 }
@@ -195,7 +195,7 @@ TEST_F(PlatformLife, ARestInsideABlockDoesNotWaitAndItsThreadEnds) {
         rested.Add();
     });
     ASSERT_TRUE(rested.Reaches(1));
-    EXPECT_EQ(WaitForThreadsOfProcess(m_threadsBefore), m_threadsBefore);
+    EXPECT_TRUE(ThreadsComeDownTo(m_threadsBefore));
     RemoveNoticeHandler(LIFE, {1, 1});
 }
 
@@ -241,7 +241,7 @@ TEST_F(PlatformLife, ManyMayRestAtOnce) {
         std::thread other([] { Rest(); });
         one.join();
         other.join();
-        EXPECT_EQ(WaitForThreadsOfProcess(m_threadsBefore), m_threadsBefore);
+        EXPECT_TRUE(ThreadsComeDownTo(m_threadsBefore));
         RemoveNoticeHandler(LIFE, {1, 1});
     }
 }

@@ -105,7 +105,7 @@ protected:
             if (!outcome.ranOut) {
                 EXPECT_EQ(outcome.answer, Answer::Yes);
                 EXPECT_TRUE(starved.lasts.Reaches(1));
-                EXPECT_EQ(WaitForThreadsOfProcess(threads), threads);
+                EXPECT_TRUE(ThreadsComeDownTo(threads));
                 return allocations;
             }
             EXPECT_EQ(outcome.answer, Answer::No) << "memory for " << allocations;
@@ -116,7 +116,7 @@ protected:
                 return allocations;
             }
             EXPECT_EQ(starved.calls.Count(), 0) << "a refused request has run";
-            EXPECT_EQ(WaitForThreadsOfProcess(threads), threads);
+            EXPECT_TRUE(ThreadsComeDownTo(threads));
         }
         ADD_FAILURE() << "there is never enough";
         return MANY;

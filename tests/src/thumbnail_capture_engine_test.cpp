@@ -120,12 +120,12 @@ TEST_F(ThumbnailEngine, HasNoThreadWhenThereIsNoWorkAndAfterStop) {
     CThumbnailLog log;
     EXPECT_TRUE(engine->RequestWindows({1}, log));
     ASSERT_TRUE(log.lasts.Reaches(1));
-    EXPECT_EQ(WaitForThreadsOfProcess(threads), threads);
+    EXPECT_TRUE(ThreadsComeDownTo(threads));
     Occupy();
     EXPECT_EQ(CountThreadsOfProcess(), threads + 1);
     held.Release();
     engine->stop();
-    EXPECT_EQ(WaitForThreadsOfProcess(threads), threads);
+    EXPECT_TRUE(ThreadsComeDownTo(threads));
 }
 
 TEST_F(ThumbnailEngine, RefusesARequestWhenNoThreadCanBeStartedAndTakesTheNext) {

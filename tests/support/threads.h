@@ -182,6 +182,18 @@ inline std::ptrdiff_t CountThreadsOfProcess() {
                          [](const auto& task) { return !IsThreadEnding(task.path()); });
 }
 
+/// False when there are still more after PATIENCE. Fewer are all right: one that has just ended may have been
+/// counted before.
+[[nodiscard]] inline bool ThreadsComeDownTo(std::ptrdiff_t count) {
+    const auto deadline = std::chrono::steady_clock::now() + PATIENCE;
+    while (CountThreadsOfProcess() > count) {
+        if (std::chrono::steady_clock::now() >= deadline)
+            return false;
+        std::this_thread::yield();
+    }
+    return true;
+}
+
 /// A thread that nobody joins takes a moment to end. Gives the count that it found last.
 inline std::ptrdiff_t WaitForThreadsOfProcess(std::ptrdiff_t count) {
     const auto deadline = std::chrono::steady_clock::now() + PATIENCE;

@@ -199,5 +199,5 @@ TEST(ComTaskThread, LeavesNoThreadBehind) {
         EXPECT_EQ(thread->Join(), 0);
         EXPECT_EQ(thread.use_count(), 1);
     }
-    EXPECT_EQ(WaitForThreadsOfProcess(threads), threads);
+    EXPECT_TRUE(ThreadsComeDownTo(threads));
 }

@@ -307,7 +307,7 @@ TEST(ACmThread, HasItsObjectAsLongAsItRuns) {
     }
     EXPECT_FALSE(watch.expired()) << "a thread that runs has its object";
     gate.Open();
-    EXPECT_EQ(WaitForThreadsOfProcess(threads), threads);
+    EXPECT_TRUE(ThreadsComeDownTo(threads));
     EXPECT_TRUE(watch.expired());
 }
 
@@ -324,7 +324,7 @@ TEST(ACmThread, WhoseLastShareGoesOnItselfLeavesItsStackToTheNextThreads) {
         ASSERT_EQ(thread->Start(), 0);
         thread.reset();
         gate.Open();
-        ASSERT_EQ(WaitForThreadsOfProcess(threads), threads);
+        ASSERT_TRUE(ThreadsComeDownTo(threads));
     }
     EXPECT_LT(AddressSpaceOfProcess(), before + THREADS / 2 * StackSizeOfThreads());
 }
