@@ -3,19 +3,35 @@
 
 #include "util/cm_never_destroyed.h"
 
+#include <linux/futex.h>
 #include <pthread.h>
+#include <sys/syscall.h>
+#include <time.h>
+#include <unistd.h>
 
 #include <algorithm>
-#include <atomic>
+#include <climits>
 
 namespace {
 
 using std::chrono::nanoseconds;
 
+/// What the clocks of std::chrono tell, without the way through a library that a tick needs for nothing else.
+nanoseconds Read(clockid_t clock) {
+    timespec now{};
+    clock_gettime(clock, &now);
+    return std::chrono::seconds(now.tv_sec) + nanoseconds(now.tv_nsec);
+}
+
+timespec ToTimespec(nanoseconds time) {
+    const auto seconds = std::chrono::floor<std::chrono::seconds>(time);
+    return {seconds.count(), (time - seconds).count()};
+}
+
 class SystemClock final : public ICmClock {
 public:
-    nanoseconds SteadyNow() const override { return std::chrono::steady_clock::now().time_since_epoch(); }
-    nanoseconds WallNow() const override { return std::chrono::system_clock::now().time_since_epoch(); }
+    nanoseconds SteadyNow() const override { return Read(CLOCK_MONOTONIC); }
+    nanoseconds WallNow() const override { return Read(CLOCK_REALTIME); }
     bool RunsByItself() const override { return true; }
 };
 
@@ -111,12 +127,30 @@ void CCmWaitPoint::WaitUntil(Lock& lock, nanoseconds deadline) {
     if (now >= deadline)
         return;
     if (!clock.RunsByItself()) {
-        m_condition.wait(lock);
+        Wait(lock);
         return;
     }
-    // Far deadlines would overflow inside the condition; waking early is allowed.
+    // Far deadlines would overflow; waking early is allowed.
     constexpr nanoseconds LONGEST_SLEEP = std::chrono::hours(1);
-    m_condition.wait_for(lock, std::min(deadline - now, LONGEST_SLEEP));
+    const timespec end = ToTimespec(now + std::min(deadline - now, LONGEST_SLEEP));
+    Sleep(lock, &end);
+}
+
+/// Who notifies counts first and then looks for sleepers, and who goes to sleep is a sleeper first: then
+/// either is seen by the other, and the system puts nobody to sleep whose count isn't the last one any more.
+void CCmWaitPoint::Sleep(Lock& lock, const timespec* end) {
+    const std::uint32_t notices = m_notices.load();
+    m_sleepers.fetch_add(1);
+    lock.unlock();
+    syscall(SYS_futex, &m_notices, FUTEX_WAIT_BITSET_PRIVATE, notices, end, nullptr, FUTEX_BITSET_MATCH_ANY);
+    m_sleepers.fetch_sub(1);
+    lock.lock();
+}
+
+void CCmWaitPoint::NotifyAll() {
+    m_notices.fetch_add(1);
+    if (m_sleepers.load() != 0)
+        syscall(SYS_futex, &m_notices, FUTEX_WAKE_PRIVATE, INT_MAX);
 }
 
 void CmWakeAllWaitPoints() {

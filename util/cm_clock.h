@@ -1,9 +1,10 @@
 // SPDX-License-Identifier: Apache-2.0
 #pragma once
 
+#include <atomic>
 #include <chrono>
-#include <condition_variable>
 #include <cstdint>
+#include <ctime>
 #include <mutex>
 
 /// Every clock of the library, and every timed wait, stands on one replaceable source of time.
@@ -76,18 +77,24 @@ public:
     Lock Acquire() { return Lock(m_mutex); }
 
     /// Sleeps until notified. May also wake for no reason, so call it in a loop that tests the condition.
-    void Wait(Lock& lock) { m_condition.wait(lock); }
+    void Wait(Lock& lock) { Sleep(lock, nullptr); }
 
     /// Sleeps until notified or until CmSteadyNow() has reached `deadline`. May also wake for no reason.
     void WaitUntil(Lock& lock, std::chrono::nanoseconds deadline);
 
-    void NotifyAll() { m_condition.notify_all(); }
+    void NotifyAll();
 
 private:
     friend void CmWakeAllWaitPoints();
 
+    /// Until then on the system's steady clock; null for as long as it takes.
+    void Sleep(Lock& lock, const timespec* end);
+
     std::mutex m_mutex;
-    std::condition_variable m_condition;
+    // What sleepers sleep on. A condition of the standard library takes its mutex as if others waited for it,
+    // so each sleep costs one call of the system more.
+    std::atomic<std::uint32_t> m_notices{0};
+    std::atomic<std::uint32_t> m_sleepers{0};
     // The list of all wait points, guarded by a mutex of its own.
     CCmWaitPoint* m_next = nullptr;
     CCmWaitPoint* m_previous = nullptr;

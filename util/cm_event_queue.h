@@ -4,6 +4,7 @@
 #include "util/cm_clock.h"
 
 #include <array>
+#include <condition_variable>
 #include <deque>
 #include <limits>
 #include <optional>

@@ -4,6 +4,7 @@
 #include "tests/support/threads.h"
 
 #include <chrono>
+#include <condition_variable>
 #include <mutex>
 #include <thread>
 

@@ -2,10 +2,12 @@
 #include "util/cm_clock.h"
 
 #include "tests/support/clock_moved_during_read.h"
+#include "tests/support/test_effort.h"
 #include "tests/support/threads.h"
 
 #include <gtest/gtest.h>
 
+#include <atomic>
 #include <chrono>
 #include <thread>
 
@@ -198,6 +200,37 @@ TEST(CmWakeAllWaitPoints, ReachesEachWaitPointThatIsStillThere) {
     EXPECT_TRUE(awake.Reaches(2));
     one.join();
     two.join();
+}
+
+/// Two threads that take turns: a notice that one of them misses on its way to sleep leaves both asleep. One
+/// in some fifty thousand would be missed if nobody counted them.
+TEST(CCmWaitPoint, MissesNoNoticeOnTheWayToSleep) {
+    const int turns = TestRounds(400'000);
+    const std::chrono::nanoseconds enough = CmSteadyNow() + 3s; // on a machine that has other work
+    CCmWaitPoint point;
+    int turn = 0;
+    std::atomic<bool> missed{false};
+    const auto take = [&](int mine) {
+        while (!missed) {
+            const std::chrono::nanoseconds now = CmSteadyNow();
+            const std::chrono::nanoseconds limit = now + 30s;
+            CCmWaitPoint::Lock lock = point.Acquire();
+            while (turn < turns && turn % 2 != mine && !missed) {
+                point.WaitUntil(lock, limit);
+                missed = missed || CmSteadyNow() >= limit;
+            }
+            if (turn >= turns)
+                break;
+            turn = now < enough ? turn + 1 : turns;
+            lock.unlock();
+            point.NotifyAll(); // from outside, when the other one may be anywhere
+        }
+        point.NotifyAll();
+    };
+    std::thread other([&] { take(1); });
+    take(0);
+    other.join();
+    EXPECT_FALSE(missed) << "at turn " << turn;
 }
 
 TEST(CCmWaitPoint, MissesNoMoveOfTheClockOnTheWayToSleep) {
