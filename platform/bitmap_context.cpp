@@ -147,6 +147,12 @@ struct Drawing {
     }
     std::uint8_t* Target(std::int64_t y) const { return context.Pixel(clip.left, y); }
     std::size_t Count() const { return static_cast<std::size_t>(clip.Width()); }
+    /// All that is seen, not faded; `first` is the first pixel of it.
+    void DrawRowsOf(const std::uint8_t* first) const {
+        DrawRows(layout, {first, source.stride}, context.layout,
+                 {Target(clip.top), static_cast<std::size_t>(context.bytesPerRow)}, Count(),
+                 static_cast<std::size_t>(clip.Height()));
+    }
     void DrawRowTo(std::int64_t y, const std::uint8_t* row) const {
         DrawFadedRow(layout, row, context.imageAlpha, context.layout, Target(y), Count());
     }
@@ -155,10 +161,14 @@ struct Drawing {
 void DrawUnscaled(const Drawing& drawing) {
     const std::size_t left =
         static_cast<std::size_t>(drawing.clip.left - drawing.box.left) * CGBytesPerPixel(drawing.layout);
-    for (std::int64_t y = drawing.clip.top; y < drawing.clip.bottom; ++y) {
-        const auto row = static_cast<std::size_t>(y - drawing.box.top);
-        drawing.DrawRowTo(y, drawing.source.pixels + row * drawing.source.stride + left);
+    const auto above = static_cast<std::size_t>(drawing.clip.top - drawing.box.top);
+    const std::uint8_t* const first = drawing.source.pixels + above * drawing.source.stride + left;
+    if (drawing.context.imageAlpha == 255) {
+        drawing.DrawRowsOf(first);
+        return;
     }
+    for (std::int64_t y = drawing.clip.top; y < drawing.clip.bottom; ++y)
+        drawing.DrawRowTo(y, first + static_cast<std::size_t>(y - drawing.clip.top) * drawing.source.stride);
 }
 
 /// Scales into the context itself and mends the order of the bytes there, a band at a time, while it is still

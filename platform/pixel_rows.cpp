@@ -9,6 +9,10 @@
 #include <bit>
 #include <cstring>
 
+#if defined(__SSE2__)
+#include <emmintrin.h>
+#endif
+
 namespace platform {
 
 namespace {
@@ -138,15 +142,41 @@ struct FrontToLast {
 constexpr std::size_t PIXELS_PER_LINE = 2 * SOME;
 /// So far ahead of the writing it is fetched. What is nearer comes too late, what is farther is no better.
 constexpr std::size_t BYTES_AHEAD = 1024;
+constexpr std::size_t BYTES_AHEAD_PAST_CACHE = 2048;
+/// What is larger doesn't stay in the part of the cache that a processor has to itself.
+constexpr std::size_t BYTES_OF_LARGE_PICTURE = std::size_t{1} << 20U;
 /// In shorter rows too much would be fetched beyond the end.
 constexpr std::size_t PIXELS_OF_LONG_ROW = 512;
 
 /// Processors guess from what is read what will be read next, but wait for each line that is written.
-[[gnu::always_inline]] inline void FetchAhead(const std::uint8_t* target) {
+template <bool ForWriting>
+[[gnu::always_inline]] inline void FetchAhead(const std::uint8_t* pixels, std::size_t distance) {
     // A number, since it may lie beyond the end.
-    const auto ahead = reinterpret_cast<std::uintptr_t>(target) + BYTES_AHEAD;
-    __builtin_prefetch(reinterpret_cast<const void*>(ahead), 1);
+    const auto ahead = reinterpret_cast<std::uintptr_t>(pixels) + distance;
+    __builtin_prefetch(reinterpret_cast<const void*>(ahead), ForWriting ? 1 : 0);
 }
+
+#if defined(__SSE2__)
+/// `target` is where a vector of that size may begin.
+[[gnu::always_inline]] inline void WritePastCache(const SomePixels& pixels, std::uint8_t* target) {
+    const auto lower = __builtin_shufflevector(pixels, pixels, 0, 1, 2, 3);
+    const auto upper = __builtin_shufflevector(pixels, pixels, 4, 5, 6, 7);
+    _mm_stream_si128(reinterpret_cast<__m128i*>(target), std::bit_cast<__m128i>(lower));
+    _mm_stream_si128(reinterpret_cast<__m128i*>(target) + 1, std::bit_cast<__m128i>(upper));
+}
+
+/// Other threads may see what was written past the cache later than what is written afterwards, unless it has
+/// arrived by then.
+void AwaitWritesPastCache() {
+    _mm_sfence();
+}
+#else
+[[gnu::always_inline]] inline void WritePastCache(const SomePixels& pixels, std::uint8_t* target) {
+    *reinterpret_cast<SomePixels*>(target) = pixels;
+}
+
+void AwaitWritesPastCache() {}
+#endif
 
 /// Reads and writes all memory once, which is what it takes its time for. `set` has the bits that are set in
 /// each pixel. Compilers have to see where source and target are one.
@@ -175,7 +205,7 @@ private:
     /// One line is asked for at a time: of several at once, the next pixels have to wait for all.
     [[gnu::always_inline]] static void TurnLine(const std::uint8_t* source, std::uint8_t* target,
                                                 std::uint32_t set) {
-        FetchAhead(target);
+        FetchAhead<true>(target, BYTES_AHEAD);
         TurnSome(source, target, set);
         TurnSome(source + SOME * 4, target + SOME * 4, set);
     }
@@ -188,33 +218,74 @@ private:
     }
 };
 
+/// Writes whole lines of the cache straight to memory. Memory is read no slower afterwards, whereas a line
+/// that is written by way of the cache has to be fetched first, and drives out another one.
+template <class Order>
+struct TurnPastCacheLoop {
+    [[gnu::always_inline]] static void Run(const std::uint8_t* source, std::uint8_t* target,
+                                           std::size_t count, std::uint32_t set) {
+        const std::size_t before = std::min(PixelsToLine(target), count);
+        TurnLoop<Order>::Run(source, target, before, set);
+        std::size_t done = before;
+        for (; done + PIXELS_PER_LINE <= count; done += PIXELS_PER_LINE)
+            TurnLine(source + done * 4, target + done * 4, set);
+        TurnLoop<Order>::Run(source + done * 4, target + done * 4, count - done, set);
+    }
+
+private:
+    static constexpr std::size_t BYTES_PER_LINE = PIXELS_PER_LINE * 4;
+
+    /// Up to where a line begins; more than any row has if no pixel stands there.
+    static std::size_t PixelsToLine(const std::uint8_t* target) {
+        const auto address = reinterpret_cast<std::uintptr_t>(target);
+        const std::size_t bytes = (0 - address) % BYTES_PER_LINE;
+        return bytes % 4 == 0 ? bytes / 4 : SIZE_MAX;
+    }
+
+    [[gnu::always_inline]] static void TurnLine(const std::uint8_t* source, std::uint8_t* target,
+                                                std::uint32_t set) {
+        FetchAhead<false>(source, BYTES_AHEAD_PAST_CACHE);
+        TurnSome(source, target, set);
+        TurnSome(source + SOME * 4, target + SOME * 4, set);
+    }
+
+    [[gnu::always_inline]] static void TurnSome(const std::uint8_t* source, std::uint8_t* target,
+                                                std::uint32_t set) {
+        SomePixels pixels = *reinterpret_cast<const SomePixels*>(source);
+        Order::Turn(pixels);
+        pixels |= set;
+        WritePastCache(pixels, target);
+    }
+};
+
 /// The bits of a byte within a pixel's word.
 constexpr std::uint32_t BitsOf(std::size_t byte) {
     return std::uint32_t{0xff} << (byte * 8);
 }
 
 /// With `isOpaque`, the target's byte for alpha becomes 255.
+template <template <class> class Loop>
 void Reorder(Order from, const std::uint8_t* source, Order to, std::uint8_t* target, std::size_t count,
              bool isOpaque) {
     const std::uint32_t set = isOpaque ? BitsOf(to.alpha) : 0;
     if (from == to) {
         if (isOpaque)
-            RunLoop<TurnLoop<Same>>(source, target, count, set);
+            RunLoop<Loop<Same>>(source, target, count, set);
         else if (source != target)
             std::memcpy(target, source, count * 4);
     } else if (from.alpha == to.alpha) {
-        RunLoop<TurnLoop<FirstAndThirdSwapped>>(source, target, count, set);
+        RunLoop<Loop<FirstAndThirdSwapped>>(source, target, count, set);
     } else if (to.red == from.red + 1 && to.green == from.green + 1) {
-        RunLoop<TurnLoop<LastToFront>>(source, target, count, set);
+        RunLoop<Loop<LastToFront>>(source, target, count, set);
     } else if (to.red + 1 == from.red && to.green + 1 == from.green) {
-        RunLoop<TurnLoop<FrontToLast>>(source, target, count, set);
+        RunLoop<Loop<FrontToLast>>(source, target, count, set);
     } else {
-        RunLoop<TurnLoop<Reversed>>(source, target, count, set);
+        RunLoop<Loop<Reversed>>(source, target, count, set);
     }
 }
 
 void MakeOpaque(std::uint8_t* pixels, Order order, std::size_t count) {
-    Reorder(order, pixels, order, pixels, count, true);
+    Reorder<TurnLoop>(order, pixels, order, pixels, count, true);
 }
 
 /// libyuv tells the first component's byte by names of its own: what it calls RGB24 and ARGB share it.
@@ -312,10 +383,10 @@ void ConvertRow(CGPixelLayout from, const std::uint8_t* source, CGPixelLayout to
         const Order order = OrderOf(to);
         const bool isOpaque = !CGHasAlpha(from) || !CGHasAlpha(to);
         if (HasFourComponentBytes(from)) {
-            Reorder(OrderOf(from), source, order, target, count, isOpaque);
+            Reorder<TurnLoop>(OrderOf(from), source, order, target, count, isOpaque);
         } else {
             ExpandTo4Bytes(from, source, target, count);
-            Reorder(RGBA_ORDER, target, order, target, count, isOpaque);
+            Reorder<TurnLoop>(RGBA_ORDER, target, order, target, count, isOpaque);
         }
     }
 }
@@ -348,9 +419,22 @@ void DrawRow(CGPixelLayout from, const std::uint8_t* source, CGPixelLayout to, s
     }
     ForEachPiece(count, [=](std::size_t offset, std::size_t pixels) {
         Piece reordered;
-        Reorder(sourceOrder, source + offset * 4, targetOrder, reordered.data(), pixels, false);
+        Reorder<TurnLoop>(sourceOrder, source + offset * 4, targetOrder, reordered.data(), pixels, false);
         BlendRow(reordered.data(), to, target + offset * CGBytesPerPixel(to), pixels);
     });
+}
+
+void DrawRows(CGPixelLayout from, const PixelRowsIn& source, CGPixelLayout to, const PixelRowsOut& target,
+              std::size_t count, std::size_t rows) noexcept {
+    const bool isTurned = HasFourComponentBytes(from) && !CGHasAlpha(from) && to != CGPixelLayout::RGB;
+    if (!isTurned || count * rows * 4 < BYTES_OF_LARGE_PICTURE) {
+        for (std::size_t y = 0; y < rows; ++y)
+            DrawRow(from, source.Row(y), to, target.Row(y), count);
+        return;
+    }
+    for (std::size_t y = 0; y < rows; ++y)
+        Reorder<TurnPastCacheLoop>(OrderOf(from), source.Row(y), OrderOf(to), target.Row(y), count, true);
+    AwaitWritesPastCache();
 }
 
 void DrawFadedRow(CGPixelLayout from, const std::uint8_t* source, std::uint8_t alpha, CGPixelLayout to,

@@ -27,7 +27,27 @@ void BlendRow(const std::uint8_t* source, CGPixelLayout layout, std::uint8_t* ta
 void DrawRow(CGPixelLayout from, const std::uint8_t* source, CGPixelLayout to, std::uint8_t* target,
              std::size_t count) noexcept;
 
-/// The same with all of the source faded to `alpha`/255.
+/// Rows that lie `stride` bytes apart.
+struct PixelRowsIn {
+    const std::uint8_t* pixels;
+    std::size_t stride;
+
+    const std::uint8_t* Row(std::size_t y) const { return pixels + y * stride; }
+};
+struct PixelRowsOut {
+    std::uint8_t* pixels;
+    std::size_t stride;
+
+    std::uint8_t* Row(std::size_t y) const { return pixels + y * stride; }
+};
+
+/// Lays rows of `count` pixels over others, each as DrawRow does. Large pictures that have no alpha are
+/// written past the processor's cache, which is too small for them. No row of the target may be one of the
+/// source's.
+void DrawRows(CGPixelLayout from, const PixelRowsIn& source, CGPixelLayout to, const PixelRowsOut& target,
+              std::size_t count, std::size_t rows) noexcept;
+
+/// The same as DrawRow, with all of the source faded to `alpha`/255.
 void DrawFadedRow(CGPixelLayout from, const std::uint8_t* source, std::uint8_t alpha, CGPixelLayout to,
                   std::uint8_t* target, std::size_t count) noexcept;
 

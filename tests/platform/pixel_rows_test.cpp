@@ -174,5 +174,53 @@ TEST_P(PixelRows, AreConvertedToTheLastPixelBeforeTheEndOfMemory) {
     munmap(mapped, length + page);
 }
 
+/// Of any place in memory: what is written past the cache begins at a line of it.
+TEST_P(PixelRows, OfPicturesAreThoseThatAreDrawnOneByOne) {
+    for (int i = 0; i < TestRounds(40); ++i) {
+        const CGPixelLayout from = SomeLayout();
+        const CGPixelLayout to = SomeLayout();
+        const std::size_t count = 1 + m_random() % 2000;
+        // On both sides of where pictures become large ones.
+        const std::size_t rows = 1 + m_random() % (400'000 / count + 2);
+        const std::size_t sourceStride = count * CGBytesPerPixel(from) + m_random() % 9;
+        const std::size_t targetStride = count * CGBytesPerPixel(to) + m_random() % 9;
+        const Row source(m_random, CGPixelLayout::RGB, (sourceStride * rows + 70) / 3, Content::Noise);
+        const std::size_t sourceStart = m_random() % 65;
+        const std::size_t targetStart = m_random() % 65;
+        Bytes target(targetStride * rows + 130, 0x5a);
+        Bytes expected = target;
+        const PixelRowsIn in{source.bytes.data() + sourceStart, sourceStride};
+        for (std::size_t y = 0; y < rows; ++y)
+            DrawRow(from, in.Row(y), to, expected.data() + targetStart + y * targetStride, count);
+        DrawRows(from, in, to, {target.data() + targetStart, targetStride}, count, rows);
+        ASSERT_EQ(target, expected) << rows << " rows, " << Named(from, to, count, m_seed);
+    }
+}
+
+/// The last row of a large picture ends where memory does, at the beginning and at the end.
+TEST_P(PixelRows, OfLargePicturesStayWithinTheirMemory) {
+    constexpr std::size_t COUNT = 1024;
+    constexpr std::size_t ROWS = 512;
+    const auto page = static_cast<std::size_t>(sysconf(_SC_PAGESIZE));
+    const std::size_t length = COUNT * ROWS * 4;
+    const auto map = [&] {
+        void* const mapped = mmap(nullptr, length + 2 * page, PROT_NONE, MAP_PRIVATE | MAP_ANONYMOUS, -1, 0);
+        auto* const memory = static_cast<std::uint8_t*>(mapped) + page;
+        EXPECT_EQ(mprotect(memory, length, PROT_READ | PROT_WRITE), 0);
+        return memory;
+    };
+    std::uint8_t* const source = map();
+    std::uint8_t* const target = map();
+    for (std::size_t i = 0; i < length; ++i)
+        source[i] = static_cast<std::uint8_t>(m_random());
+    DrawRows(CGPixelLayout::BGRX, {source, COUNT * 4}, CGPixelLayout::RGBX, {target, COUNT * 4}, COUNT, ROWS);
+    for (std::size_t i = 0; i < length; i += 4) {
+        const std::array<std::uint8_t, 4> expected{source[i + 2], source[i + 1], source[i], 255};
+        ASSERT_TRUE(std::equal(expected.begin(), expected.end(), target + i)) << "pixel " << i / 4;
+    }
+    munmap(source - page, length + 2 * page);
+    munmap(target - page, length + 2 * page);
+}
+
 INSTANTIATE_TEST_SUITE_P(Registers, PixelRows, testing::Bool(),
                          [](const auto& each) { return each.param ? "Wide" : "Baseline"; });
