@@ -24,8 +24,8 @@ constexpr int UNAVAILABLE_PASSES_TOLERATED = 4;
 
 /// An engine makes both of its frames itself, so they are of one kind.
 bool IsSameData(IShareFrame& a, IShareFrame& b) {
-    auto* const ownA = dynamic_cast<CShareFrame*>(&a);
-    auto* const ownB = dynamic_cast<CShareFrame*>(&b);
+    CShareFrame* const ownA = CShareFrame::OwnOf(&a);
+    CShareFrame* const ownB = CShareFrame::OwnOf(&b);
     return ownA != nullptr && ownB != nullptr && ownA->HasSameData(*ownB);
 }
 
@@ -34,7 +34,7 @@ bool IsSameData(IShareFrame& a, IShareFrame& b) {
 class FillingGuard {
 public:
     FillingGuard(IShareFrame& frame, bool isOwnCapturer)
-        : m_frame(dynamic_cast<CShareFrame*>(&frame)),
+        : m_frame(CShareFrame::OwnOf(&frame)),
           m_isOwnCapturer(isOwnCapturer) {
         if (m_frame != nullptr)
             m_frame->BeginFilling();

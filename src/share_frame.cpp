@@ -5,6 +5,7 @@
 #include <atomic>
 #include <cstddef>
 #include <cstring>
+#include <typeinfo>
 #include <utility>
 
 namespace {
@@ -55,7 +56,7 @@ bool CShareFrame::_ExpandFrameData() {
     _DropNote();
     m_pOwnBuf.reset();
     m_nBufLen = 0;
-    m_pOwnBuf = std::make_unique<unsigned char[]>(static_cast<std::size_t>(needed));
+    m_pOwnBuf = platform::NewPixelMemory(static_cast<std::size_t>(needed));
     m_nBufLen = needed;
     return true;
 }
@@ -243,7 +244,7 @@ int CShareFrame::CopyIShareFrame(IShareFrame* source) {
     int len = std::min(GetFrameDataLen(), source->GetFrameDataLen());
     // Since a Reset a frame of ours may have less than its geometry asks for. Others answer for their
     // figures.
-    const auto* const frame = dynamic_cast<const CShareFrame*>(source);
+    const CShareFrame* const frame = OwnOf(source);
     if (frame != nullptr && frame->_ExceedsOwnBuf(len)) {
         len = frame->m_nBufLen;
     }
@@ -255,8 +256,16 @@ int CShareFrame::_GetBackedDataLen() const {
     return std::min(_GetFrameDataLen(), m_nBufLen);
 }
 
+/// Asked several times a tick. Nearly all frames are just of this class, which is told by one comparison.
+CShareFrame* CShareFrame::OwnOf(IShareFrame* frame) {
+    if (frame != nullptr && typeid(*frame) == typeid(CShareFrame)) {
+        return static_cast<CShareFrame*>(frame);
+    }
+    return dynamic_cast<CShareFrame*>(frame);
+}
+
 int CShareFrame::BackedDataLen(IShareFrame& frame) {
-    const auto* const ours = dynamic_cast<const CShareFrame*>(&frame);
+    const CShareFrame* const ours = OwnOf(&frame);
     return std::max(ours != nullptr ? ours->_GetBackedDataLen() : frame.GetFrameDataLen(), 0);
 }
 
@@ -278,7 +287,7 @@ bool CShareFrame::HasSameData(CShareFrame& other) {
 }
 
 int CShareFrame::SwapOrCopy(IShareFrame* other) {
-    auto* const frame = dynamic_cast<CShareFrame*>(other);
+    CShareFrame* const frame = OwnOf(other);
     if (frame == nullptr || m_pExternalBuf != nullptr || frame->m_pExternalBuf != nullptr) {
         return CopyIShareFrame(other);
     }
@@ -325,7 +334,7 @@ void CShareFrame::PutNote(std::unique_ptr<ShareFrameNote> note) {
 }
 
 void CShareFrame::DropNoteOf(IShareFrame& frame) {
-    if (auto* const ours = dynamic_cast<CShareFrame*>(&frame)) {
+    if (CShareFrame* const ours = OwnOf(&frame)) {
         ours->_DropNote();
     }
 }

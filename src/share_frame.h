@@ -1,6 +1,7 @@
 // SPDX-License-Identifier: Apache-2.0
 #pragma once
 
+#include "platform/pixel_memory.h"
 #include "src/share_frame_note.h"
 #include "util/qvn_unknown_impl.h"
 
@@ -67,6 +68,9 @@ public:
     /// comparison.
     bool HasSameData(CShareFrame& other);
 
+    /// The frame, if it is one of ours; else null, as for null.
+    static CShareFrame* OwnOf(IShareFrame* frame);
+
     /// How much of its data length a frame has memory for, in bytes: after a Reset that may be less than all.
     /// Others than ours answer for their figures.
     static int BackedDataLen(IShareFrame& frame);
@@ -120,7 +124,7 @@ private:
 
     int m_nWidth = 0;
     int m_nHeight = 0;
-    std::unique_ptr<unsigned char[]> m_pOwnBuf;
+    platform::PixelMemory m_pOwnBuf;
     /// The client's memory; takes precedence over ours.
     unsigned char* m_pExternalBuf = nullptr;
     /// Bytes of the buffer in force, exactly so when that is ours. A detached buffer leaves its length here.

@@ -199,7 +199,7 @@ bool CShareCGSCapturer::captureSameWindows(IShareFrame& frame) {
 }
 
 void CShareCGSCapturer::PutInto(IShareFrame& frame, Pass& pass) {
-    auto* const own = dynamic_cast<CShareFrame*>(&frame);
+    CShareFrame* const own = CShareFrame::OwnOf(&frame);
     std::unique_ptr<ShareCompositionNote> before = own != nullptr ? TakeNote(*own) : nullptr;
     PrepareFrame(frame, pass);
     m_rectLastCapture = pass.drawRect;

@@ -29,7 +29,7 @@ std::optional<ShareStandingPicture::Terms> ShareStandingPicture::TermsOf(
 }
 
 bool ShareStandingPicture::IsIn(IShareFrame& frame) const {
-    auto* const own = dynamic_cast<CShareFrame*>(&frame);
+    CShareFrame* const own = CShareFrame::OwnOf(&frame);
     if (own == nullptr || !own->AllowsNote() || own->NoteNumber() != m_nNote)
         return false;
     own->ConfirmNote();
@@ -38,7 +38,7 @@ bool ShareStandingPicture::IsIn(IShareFrame& frame) const {
 }
 
 void ShareStandingPicture::Keep(IShareFrame& frame, const Terms& terms, std::uint64_t moment) {
-    const auto* const own = dynamic_cast<const CShareFrame*>(&frame);
+    const CShareFrame* const own = CShareFrame::OwnOf(&frame);
     m_nNote = own != nullptr ? own->NoteNumber() : 0;
     m_nMoment = m_nNote != 0 ? moment : 0;
     m_terms = terms;

@@ -95,6 +95,18 @@ struct TwoPictures {
     Held<> b = NewFrame(4, 5, SHARE_FRAME_FORMAT_BGR);
 };
 
+class CDerivedFrame : public CShareFrame {};
+
+TEST(ShareFrame, TellsFramesOfOursFromOthers) {
+    const auto plain = NewFrame<CShareFrame>();
+    const auto derived = NewFrame<CDerivedFrame>();
+    const auto foreign = NewFrame<CForeignFrame>();
+    EXPECT_EQ(CShareFrame::OwnOf(plain.get()), plain.get());
+    EXPECT_EQ(CShareFrame::OwnOf(derived.get()), derived.get());
+    EXPECT_EQ(CShareFrame::OwnOf(foreign.get()), nullptr);
+    EXPECT_EQ(CShareFrame::OwnOf(nullptr), nullptr);
+}
+
 // Copy
 
 TEST(ShareFrameCopy, RefusesNullAndChangesNothing) {
