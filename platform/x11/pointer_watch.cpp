@@ -134,11 +134,11 @@ bool PointerWatch::Settle() {
     return true;
 }
 
-std::optional<CGPoint> PointerWatch::Position(OtherAnswers others) {
+std::optional<CGPoint> PointerWatch::Position(BytesAhead ahead) {
     auto question = m_connection.Ask<xcb_query_pointer_reply_t>(
         xcb_query_pointer(m_connection.Get(), m_connection.Root()));
-    if (others == OtherAnswers::Ahead)
-        m_connection.LetAnswersGather();
+    if (ahead)
+        m_connection.LetAnswersGather(*ahead);
     const auto reply = m_connection.Await(question);
     if (reply == nullptr || reply->same_screen == 0)
         return std::nullopt;
@@ -147,14 +147,14 @@ std::optional<CGPoint> PointerWatch::Position(OtherAnswers others) {
 
 // ---- Motion
 
-std::optional<CGPoint> PointerWatch::WatchedPosition(OtherAnswers others) {
+std::optional<CGPoint> PointerWatch::WatchedPosition(BytesAhead ahead) {
     // What is told between the two requests is looked at later, and taken for news.
     if (!m_isWatched && m_connection.Has().xinput) {
         SelectMotion(MOTIONS);
         m_isWatched = true;
     }
     m_position.reset();
-    m_position = Position(others);
+    m_position = Position(ahead);
     return m_position;
 }
 

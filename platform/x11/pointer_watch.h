@@ -8,6 +8,7 @@
 #include <xcb/xcb.h>
 #include <xcb/xfixes.h>
 
+#include <cstddef>
 #include <cstdint>
 #include <memory>
 #include <optional>
@@ -33,16 +34,13 @@ public:
 
     /// Null when the server can't tell. The same object as long as the serial is the same.
     std::shared_ptr<const CursorImage> Cursor() const { return m_cursor; }
-    /// Whether other answers come ahead of that to a question.
-    enum class OtherAnswers {
-        None,
-        Ahead
-    };
+    /// Bytes of pixels that other answers bring ahead of that to a question; nothing where none come.
+    using BytesAhead = std::optional<std::size_t>;
 
     /// Where the pointer is in the root, in pixels: asks the server.
-    std::optional<CGPoint> Position(OtherAnswers others = OtherAnswers::None);
+    std::optional<CGPoint> Position(BytesAhead ahead = std::nullopt);
     /// The same, and is told from then on when it moves, once: a mouse in motion isn't listened to.
-    std::optional<CGPoint> WatchedPosition(OtherAnswers others);
+    std::optional<CGPoint> WatchedPosition(BytesAhead ahead);
     /// Where it was at the last WatchedPosition, unless it has been moved since as far as is told; a client
     /// that warps it isn't.
     std::optional<CGPoint> PositionSoFar() const { return m_isWatched ? m_position : std::nullopt; }

@@ -24,6 +24,8 @@ constexpr std::size_t MOST_RECTANGLES = 64;
 /// Pixels are asked for ahead when they have no more bytes than that: few are wasted where they are the wrong
 /// ones.
 constexpr std::size_t MOST_BYTES_AHEAD = std::size_t{64} << 10U;
+/// Whole rows are asked for ahead when they were damaged so often in a row.
+constexpr unsigned REPEATS_BEFORE_ROWS = 3;
 /// How far beside what was damaged last; letters come one after the other.
 constexpr int LETTERS_WIDE = 32;
 /// Set when another rectangle of the same report follows.
@@ -153,7 +155,8 @@ void WindowStorage::OnGone() {
 void WindowStorage::Void() {
     ForgetPixmap();
     ForgetPixels();
-    m_likely = {};
+    m_damagedLast = {};
+    m_repeats = 0;
     ++m_renewals;
 }
 
@@ -305,25 +308,48 @@ void WindowStorage::AskForDamage(xcb_xfixes_region_t parts) {
     m_changed = false;
 }
 
-void WindowStorage::AskAheadForPixels(SharedPixelsPool& pool) {
-    const int width = m_likely.right - m_likely.left;
-    const int height = m_likely.bottom - m_likely.top;
-    if (width <= 0 || height <= 0 || !m_pixels.IsOf(m_width, m_height, m_pixels.pixels))
-        return;
-    const std::size_t bytes = m_pixels.pixels.BytesPerRow(width) * static_cast<std::size_t>(height);
+std::size_t WindowStorage::AskAheadForPixels(SharedPixelsPool& pool) {
+    const bool isKnown = m_damagedLast.left < m_damagedLast.right && m_damagedLast.top < m_damagedLast.bottom;
+    if (!isKnown || !m_pixels.IsOf(m_width, m_height, m_pixels.pixels))
+        return 0;
+    const bool isOfRows = IsReadAsRows(m_damagedLast.right - m_damagedLast.left, m_width);
+    return isOfRows && m_repeats >= REPEATS_BEFORE_ROWS ? AskAheadForRows() : AskAheadForPart(pool);
+}
+
+std::size_t WindowStorage::AskAheadForPart(SharedPixelsPool& pool) {
+    const PixelRect likely{std::max(m_damagedLast.left - LETTERS_WIDE, 0), m_damagedLast.top,
+                           std::min(m_damagedLast.right + LETTERS_WIDE, m_width), m_damagedLast.bottom};
+    const int width = likely.right - likely.left;
+    const std::size_t bytes =
+        m_pixels.pixels.BytesPerRow(width) * static_cast<std::size_t>(likely.bottom - likely.top);
     std::shared_ptr<SharedPixels> block = bytes <= MOST_BYTES_AHEAD ? pool.Take(bytes) : nullptr;
     if (block == nullptr)
-        return;
-    RowsRead read = RowsRead::Ask(m_connection, Pixmap(), m_likely.left, m_likely.top, width, m_likely.bottom,
+        return 0;
+    RowsRead read = RowsRead::Ask(m_connection, Pixmap(), likely.left, likely.top, width, likely.bottom,
                                   *block, 0, m_pixels.pixels.BytesPerPixel());
-    m_ahead.emplace(PixelsAhead{m_likely, std::move(block), std::move(read)});
+    m_ahead.emplace(PixelsAhead{likely, std::move(block), std::move(read), m_renewals});
+    return bytes;
+}
+
+/// Only where nobody holds what is there now.
+std::size_t WindowStorage::AskAheadForRows() {
+    LetGoOfPictureIfAlone();
+    if (!IsOnlyShare(m_pixels.block))
+        return 0;
+    const PixelRect rows{0, m_damagedLast.top, m_width, m_damagedLast.bottom};
+    const std::size_t offset = static_cast<std::size_t>(rows.top) * m_pixels.Stride();
+    RowsRead read = RowsRead::Ask(m_connection, Pixmap(), 0, rows.top, m_width, rows.bottom, *m_pixels.block,
+                                  offset, m_pixels.pixels.BytesPerPixel());
+    m_ahead.emplace(PixelsAhead{rows, nullptr, std::move(read), m_renewals});
+    return static_cast<std::size_t>(rows.bottom - rows.top) * m_pixels.Stride();
 }
 
 std::optional<PixelsAhead> WindowStorage::TakeAhead() {
+    if (!m_ahead)
+        return std::nullopt;
     PixelRegion beyond = m_damage;
-    if (m_ahead)
-        beyond.Subtract(m_ahead->rect);
-    if (!m_ahead || m_damage.IsEmpty() || !beyond.IsEmpty()) {
+    beyond.Subtract(m_ahead->rect);
+    if (m_damage.IsEmpty() || !beyond.IsEmpty() || m_ahead->renewals != m_renewals) {
         DropAhead();
         return std::nullopt;
     }
@@ -333,8 +359,11 @@ std::optional<PixelsAhead> WindowStorage::TakeAhead() {
 /// The answer is mostly here: then the memory can be used again. Without it the server may still write there.
 void WindowStorage::DropAhead() {
     std::optional<PixelsAhead> ahead = std::exchange(m_ahead, std::nullopt);
-    if (ahead)
-        ahead->read.Finish(m_connection);
+    if (!ahead)
+        return;
+    if (ahead->block == nullptr)
+        m_damage.Add(ahead->rect);
+    ahead->read.Finish(m_connection);
 }
 
 bool WindowStorage::AwaitDamage() {
@@ -362,16 +391,17 @@ void WindowStorage::AddDamage(const xcb_xfixes_fetch_region_reply_t& answer) {
     for (const PixelRect& rect : FewerRects(rects, MOST_RECTANGLES))
         m_damage.Add(rect);
     m_damage.Intersect(all);
-    const PixelRect around = m_damage.Bounds();
-    m_likely = {std::max(around.left - LETTERS_WIDE, 0), around.top,
-                std::min(around.right + LETTERS_WIDE, m_width), around.bottom};
+    NoteDamageIn(m_damage.Bounds());
+}
+
+void WindowStorage::NoteDamageIn(const PixelRect& around) {
+    m_repeats = around == m_damagedLast ? m_repeats + 1 : 0;
+    m_damagedLast = around;
 }
 
 /// Until they are given back there are none, and nothing is known to be damaged.
 StoredPixels WindowStorage::TakePixels() {
-    // If nobody else has the picture, its memory is to be written to.
-    if (m_picture != nullptr && !m_isPictureCopied && IsOnlyShare(m_picture))
-        LetGoOfPicture();
+    LetGoOfPictureIfAlone();
     StoredPixels pixels = std::move(m_pixels);
     ForgetPixels();
     return pixels;
@@ -382,6 +412,12 @@ void WindowStorage::ForgetPixels() {
     m_questions.clear();
     m_ahead.reset();
     m_damage.Clear();
+}
+
+/// If nobody else has the picture, its memory is to be written to.
+void WindowStorage::LetGoOfPictureIfAlone() {
+    if (m_picture != nullptr && !m_isPictureCopied && IsOnlyShare(m_picture))
+        LetGoOfPicture();
 }
 
 /// How later ones come out of it is told all the same.

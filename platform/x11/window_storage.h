@@ -44,8 +44,10 @@ std::shared_ptr<Picture> PictureOf(const ServerPixels& pixels, const std::shared
 /// Pixels that are asked for before it is known where a storage was damaged.
 struct PixelsAhead {
     PixelRect rect;
-    std::shared_ptr<SharedPixels> block; ///< Takes them from its beginning, without gaps.
+    std::shared_ptr<SharedPixels> block; ///< Takes them from its beginning, without gaps; null for whole
+                                         ///< rows, which go where they belong.
     RowsRead read;
+    unsigned renewals; ///< When they were asked for.
 };
 
 /// A watch for changes or paintings of a window: a Damage object in the server.
@@ -134,14 +136,15 @@ public:
     void CountChanges();
     /// The same, and asks by way of `parts` for what was damaged so far.
     void AskForDamage(xcb_xfixes_region_t parts);
-    /// Right behind that, asks as well for the pixels of where it is likely to be, near what was damaged
-    /// last: who types goes on there. If it is, the answer needs no second question.
-    void AskAheadForPixels(SharedPixelsPool& pool);
+    /// Right behind that, asks as well for the pixels of where it is likely to be. Near what was damaged
+    /// last, as who types goes on there; or in the same rows, if they were damaged time and again, as by a
+    /// film. If it is, the answer needs no second question. Tells how many bytes come.
+    std::size_t AskAheadForPixels(SharedPixelsPool& pool);
     /// Those that were asked for behind the last question for damage, if there is some and only there; that
     /// has to be answered. They are as true as if they had been asked for now: what was painted after the
     /// question will be told later in both cases.
     std::optional<PixelsAhead> TakeAhead();
-    /// Nobody wants them any more.
+    /// Nobody wants them any more. Rows that have been read to where they belong count as damaged then.
     void DropAhead();
     /// It has changed, and what of it would be all that is to be fetched; nobody has asked yet.
     bool IsDamageWorthAsking() const { return m_changed && m_pixels.block != nullptr && m_questions.empty(); }
@@ -184,6 +187,10 @@ private:
     void ForgetPixels();
     Look LookOf(const PixelRect& visible, const std::optional<PixelRegion>& shape) const;
     void LetGoOfPicture();
+    void LetGoOfPictureIfAlone();
+    std::size_t AskAheadForPart(SharedPixelsPool& pool);
+    std::size_t AskAheadForRows();
+    void NoteDamageIn(const PixelRect& around);
     void AddDamage(const xcb_xfixes_fetch_region_reply_t& answer);
     void TellSteps(Picture& picture);
     PixelRegion UnshownIn(const PixelRect& visible) const;
@@ -204,7 +211,8 @@ private:
     bool m_changed = true;
     std::vector<Pending<xcb_xfixes_fetch_region_reply_t>> m_questions; // in their order
     PixelRegion m_damage;
-    PixelRect m_likely; // to be damaged next; empty for nothing
+    PixelRect m_damagedLast; // what lies around it; empty for nothing
+    unsigned m_repeats = 0;  // how often just that has been damaged in a row, after the first time
     std::optional<PixelsAhead> m_ahead;
     DamageWatch m_paintings; // while not all is proven
     unsigned m_reports = 0;

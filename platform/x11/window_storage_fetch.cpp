@@ -13,8 +13,6 @@ namespace {
 
 /// Reads of one storage that are on their way together.
 constexpr std::size_t MOST_PIECES = 16;
-/// From this share of a row on it costs less to have the server write the whole row than to copy the part.
-constexpr int ROW_SHARE_OF = 2;
 
 } // namespace
 
@@ -56,38 +54,39 @@ void StorageFetch::AskForPixels() {
         m_failed = true;
         return;
     }
+    std::optional<PixelsAhead> ahead = m_storage->TakeAhead();
     m_damage = m_storage->Damage();
-    const bool areHere = TakeAhead();
     if (m_damage.IsEmpty())
         return;
-    if (!areHere)
-        Plan(m_damage);
+    if (ahead)
+        return TakeAhead(*std::move(ahead));
+    Plan(m_damage);
     m_result = m_storage->TakePixels();
     m_failed = !TakeMemory();
-    if (m_failed || areHere)
+    if (m_failed)
         return;
     for (Piece& piece : m_pieces)
         AskFor(piece);
 }
 
-/// True when all that was damaged has been asked for already.
-bool StorageFetch::TakeAhead() {
-    std::optional<PixelsAhead> ahead = m_storage->TakeAhead();
-    if (!ahead)
-        return false;
-    const PixelRect& rect = ahead->rect;
+/// All that was damaged has been asked for already.
+void StorageFetch::TakeAhead(PixelsAhead ahead) {
+    const PixelRect& rect = ahead.rect;
     m_bytesAskedFor +=
         m_pixels.BytesPerRow(rect.right - rect.left) * static_cast<std::size_t>(rect.bottom - rect.top);
-    m_narrow = std::move(ahead->block);
-    m_pieces.push_back({rect, false, 0, std::move(ahead->read)});
-    return true;
+    m_result = m_storage->TakePixels();
+    const bool isOfRows = ahead.block == nullptr;
+    m_pieces.push_back({rect, isOfRows, 0, std::move(ahead.read)});
+    m_narrow = std::move(ahead.block);
+    // Whole rows are on their way to this memory, which nobody else had.
+    m_failed = !isOfRows && !TakeMemory();
 }
 
 void StorageFetch::Plan(const PixelRegion& damage) {
     const int width = m_storage->Width();
     std::size_t narrowBytes = 0;
     for (PixelRect& rect : FewerRects(damage.Rects(), MOST_PIECES)) {
-        Piece piece{rect, rect.right - rect.left >= width / ROW_SHARE_OF};
+        Piece piece{rect, IsReadAsRows(rect.right - rect.left, width)};
         if (piece.isOfRows) {
             piece.rect.left = 0;
             piece.rect.right = width;

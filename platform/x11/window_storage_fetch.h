@@ -50,7 +50,7 @@ private:
     };
 
     void AskForAll();
-    bool TakeAhead();
+    void TakeAhead(PixelsAhead ahead);
     /// Pieces that cover the damage, from top to bottom.
     void Plan(const PixelRegion& damage);
     bool TakeMemory();

@@ -72,8 +72,9 @@ public:
     bool DoDue();
 
     /// Asks for the damage of windows that are known to have changed, so that the next answer of the server
-    /// brings it along and a picture needn't wait for it once more. True when it has.
-    bool AskAhead();
+    /// brings it along and a picture needn't wait for it once more. Tells how many bytes of pixels come with
+    /// it, none mostly; nothing when there was nothing to ask for.
+    std::optional<std::size_t> AskAhead();
 
     /// One picture of the listed windows, in the order of the tree, all of one moment: when the stack changes
     /// meanwhile it is made again, at last with the server held. A window that is beyond LARGEST_STORAGE, or

@@ -267,16 +267,15 @@ TakenPicture WindowStorages::Taking::Result() {
     return taken;
 }
 
-bool WindowStorages::AskAhead() {
-    bool hasAsked = false;
+std::optional<std::size_t> WindowStorages::AskAhead() {
+    std::optional<std::size_t> bytes;
     for (const auto& [window, storage] : m_state->storages) {
         if (!storage->IsDamageWorthAsking())
             continue;
         storage->AskForDamage(m_state->Tools().parts);
-        storage->AskAheadForPixels(m_state->pool);
-        hasAsked = true;
+        bytes = bytes.value_or(0) + storage->AskAheadForPixels(m_state->pool);
     }
-    return hasAsked;
+    return bytes;
 }
 
 TakenPicture WindowStorages::Take(const WindowPictureRequest& request, WindowTree& tree,

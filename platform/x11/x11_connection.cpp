@@ -17,8 +17,8 @@
 #include <xcb/xinput.h>
 
 #include <algorithm>
-#include <ctime>
 #include <string>
+#include <thread>
 #include <vector>
 
 namespace platform::x11 {
@@ -107,10 +107,11 @@ void X11Connection::Flush() {
         Send();
 }
 
-void X11Connection::LetAnswersGather() {
-    constexpr timespec GATHERING{0, 250'000};
+void X11Connection::LetAnswersGather(std::size_t bytes) {
+    using namespace std::chrono_literals;
+    constexpr std::size_t BYTES_PER_NANOSECOND = 8; // that a server copies
     Flush();
-    nanosleep(&GATHERING, nullptr);
+    std::this_thread::sleep_for(250us + std::chrono::nanoseconds(bytes / BYTES_PER_NANOSECOND));
 }
 
 Event X11Connection::NextEvent() {

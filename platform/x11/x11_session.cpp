@@ -324,10 +324,9 @@ std::optional<CGPoint> X11Session::AskForPointer() {
     const Nanoseconds asked = CmSteadyNow();
     m_eventsAnswered = m_events;
     m_lastAnswered.reset();
-    const bool hasAsked = m_storages.AskAhead();
+    const PointerWatch::BytesAhead ahead = m_storages.AskAhead();
     const std::optional<CGPoint> pointerSoFar = m_pointer.PositionSoFar();
-    using enum PointerWatch::OtherAnswers;
-    const std::optional<CGPoint> pointer = m_pointer.WatchedPosition(hasAsked ? Ahead : None);
+    const std::optional<CGPoint> pointer = m_pointer.WatchedPosition(ahead);
     if (pointer != pointerSoFar)
         EndMoment();
     if (isTimed)

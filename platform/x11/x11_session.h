@@ -49,7 +49,7 @@ public:
     static constexpr std::chrono::nanoseconds COMPOSITOR_LAG = std::chrono::milliseconds(700);
     /// For how long pictures are taken without a word to the server, as long as it has nothing to tell: a
     /// server that stands still is found out so late, and so is a pointer that a client has warped.
-    static constexpr std::chrono::nanoseconds QUIET_LIMIT = std::chrono::milliseconds(500);
+    static constexpr std::chrono::nanoseconds QUIET_LIMIT = std::chrono::seconds(1);
 
     X11Session(X11Connection& connection, Memory& memory, ApplicationWatch& applications,
                SessionListener& listener);

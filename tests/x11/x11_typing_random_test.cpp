@@ -12,8 +12,8 @@
 #include <thread>
 #include <vector>
 
-/// A window in which somebody writes, here and there, looked at while he does: what has been painted is in
-/// the next picture, pixel by pixel, wherever it was expected.
+/// A window in which somebody writes, here and there, and now and then a film runs, looked at meanwhile: what
+/// has been painted is in the next picture, pixel by pixel, wherever it was expected.
 namespace {
 
 using namespace platform;
@@ -39,8 +39,18 @@ public:
         Settle();
     }
 
-    /// A letter at the caret, which moves on; now and then somewhere else, or something larger.
+    /// A letter at the caret, which moves on; now and then somewhere else, or something larger. For some time
+    /// it is mostly the same rows, time and again.
     void Write() {
+        if (m_film == 0 && Number(20) == 0)
+            BeginFilm();
+        if (m_film > 0) {
+            --m_film;
+            Fill(m_screen);
+            xcb_flush(m_link.Get());
+            if (Number(6) != 0)
+                return;
+        }
         if (Number(12) == 0 || m_x + 8 > WIDTH) {
             m_x = Number(WIDTH - 8);
             m_y = Number(HEIGHT - 12);
@@ -74,6 +84,13 @@ public:
     int Number(int end) { return static_cast<int>(m_random() % static_cast<unsigned>(end)); }
 
 private:
+    void BeginFilm() {
+        m_film = 12;
+        const int top = Number(HEIGHT - 60);
+        m_screen = {static_cast<std::int16_t>(Number(20)), static_cast<std::int16_t>(top), WIDTH - 40,
+                    static_cast<std::uint16_t>(20 + Number(40))};
+    }
+
     static std::size_t Index(int x, int y) {
         return static_cast<std::size_t>(y) * WIDTH + static_cast<std::size_t>(x);
     }
@@ -95,6 +112,8 @@ private:
     std::vector<std::uint32_t> m_pixels;
     int m_x = 0;
     int m_y = 0;
+    int m_film = 0; // pictures of it to come
+    xcb_rectangle_t m_screen{};
 };
 
 class X11TypingRandom : public testing::Test {
