@@ -27,6 +27,10 @@ add_compile_options(-ffile-prefix-map=${PROJECT_SOURCE_DIR}/=)
 # The linker places some functions by name (src/tick_functions.ld).
 add_compile_options(-ffunction-sections)
 
+# All is bound at load time, so calls of other libraries need no stubs in between. A tick that has been out of the
+# processor's caches reads each page that it goes through anew.
+add_compile_options(-fno-plt)
+
 if(SCREENSHARE_SANITIZE STREQUAL "address")
     set(sanitizer_options -fsanitize=address,undefined,float-cast-overflow -fno-sanitize-recover=all)
 elseif(SCREENSHARE_SANITIZE STREQUAL "thread")
