@@ -6,11 +6,11 @@
 #include <linux/futex.h>
 #include <pthread.h>
 #include <sys/syscall.h>
-#include <time.h>
 #include <unistd.h>
 
 #include <algorithm>
 #include <climits>
+#include <ctime>
 
 namespace {
 

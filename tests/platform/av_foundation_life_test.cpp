@@ -4,8 +4,10 @@
 #include "tests/platform/av_foundation_rig.h"
 #include "tests/support/call_on_thread.h"
 #include "tests/support/test_effort.h"
+#include "tests/support/threads.h"
 
 #include <atomic>
+#include <chrono>
 #include <cstddef>
 #include <cstdint>
 #include <iostream>
@@ -275,7 +277,9 @@ TEST_F(AVFoundationLife, NoCallBeginsAfterAStopHoweverTheyRace) {
             std::this_thread::yield();
         }
     });
-    for (int i = 0; i < rounds; ++i) {
+    // And then until enough was seen, which is a matter of how the threads meet.
+    const auto limit = std::chrono::steady_clock::now() + PATIENCE;
+    for (int i = 0; i < rounds || (calls <= rounds / 10 && std::chrono::steady_clock::now() < limit); ++i) {
         stopsItself = random() % 4 == 0;
         const int before = calls;
         stopped = false;
