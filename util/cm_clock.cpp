@@ -119,6 +119,8 @@ CCmWaitPoint::~CCmWaitPoint() {
     (m_previous != nullptr ? m_previous->m_next : g_firstWaitPoint) = m_next;
     if (m_next != nullptr)
         m_next->m_previous = m_previous;
+    // Whoever watches the order of locks would take the next mutex that lies here for this one.
+    pthread_mutex_destroy(m_mutex.native_handle());
 }
 
 void CCmWaitPoint::WaitUntil(Lock& lock, nanoseconds deadline) {
