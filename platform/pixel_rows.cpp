@@ -156,27 +156,58 @@ template <bool ForWriting>
     __builtin_prefetch(reinterpret_cast<const void*>(ahead), ForWriting ? 1 : 0);
 }
 
+/// Pixels on their way to a picture that is small enough for the cache.
+struct ThroughCache {
+    [[gnu::always_inline]] static void FetchNext(const std::uint8_t* /*source*/, const std::uint8_t* target) {
+        FetchAhead<true>(target, BYTES_AHEAD);
+    }
+    [[gnu::always_inline]] static void Write(const SomePixels& pixels, std::uint8_t* target) {
+        *reinterpret_cast<SomePixels*>(target) = pixels;
+    }
+};
+
+/// Pixels on their way to a larger one. The target is where a vector of that size may begin.
+struct PastCache {
+    [[gnu::always_inline]] static void FetchNext(const std::uint8_t* source, const std::uint8_t* /*target*/) {
+        FetchAhead<false>(source, BYTES_AHEAD_PAST_CACHE);
+    }
+    [[gnu::always_inline]] static void Write(const SomePixels& pixels, std::uint8_t* target) {
 #if defined(__SSE2__)
-/// `target` is where a vector of that size may begin.
-[[gnu::always_inline]] inline void WritePastCache(const SomePixels& pixels, std::uint8_t* target) {
-    const auto lower = __builtin_shufflevector(pixels, pixels, 0, 1, 2, 3);
-    const auto upper = __builtin_shufflevector(pixels, pixels, 4, 5, 6, 7);
-    _mm_stream_si128(reinterpret_cast<__m128i*>(target), std::bit_cast<__m128i>(lower));
-    _mm_stream_si128(reinterpret_cast<__m128i*>(target) + 1, std::bit_cast<__m128i>(upper));
-}
+        const auto lower = __builtin_shufflevector(pixels, pixels, 0, 1, 2, 3);
+        const auto upper = __builtin_shufflevector(pixels, pixels, 4, 5, 6, 7);
+        _mm_stream_si128(reinterpret_cast<__m128i*>(target), std::bit_cast<__m128i>(lower));
+        _mm_stream_si128(reinterpret_cast<__m128i*>(target) + 1, std::bit_cast<__m128i>(upper));
+#else
+        *reinterpret_cast<SomePixels*>(target) = pixels;
+#endif
+    }
+};
 
 /// Other threads may see what was written past the cache later than what is written afterwards, unless it has
 /// arrived by then.
 void AwaitWritesPastCache() {
+#if defined(__SSE2__)
     _mm_sfence();
-}
-#else
-[[gnu::always_inline]] inline void WritePastCache(const SomePixels& pixels, std::uint8_t* target) {
-    *reinterpret_cast<SomePixels*>(target) = pixels;
+#endif
 }
 
-void AwaitWritesPastCache() {}
-#endif
+template <class Order, class Way>
+[[gnu::always_inline]] inline void TurnSome(const std::uint8_t* source, std::uint8_t* target,
+                                            std::uint32_t set) {
+    SomePixels pixels = *reinterpret_cast<const SomePixels*>(source);
+    Order::Turn(pixels);
+    pixels |= set;
+    Way::Write(pixels, target);
+}
+
+/// One line is asked for at a time: of several at once, the next pixels have to wait for all.
+template <class Order, class Way>
+[[gnu::always_inline]] inline void TurnLine(const std::uint8_t* source, std::uint8_t* target,
+                                            std::uint32_t set) {
+    Way::FetchNext(source, target);
+    TurnSome<Order, Way>(source, target, set);
+    TurnSome<Order, Way>(source + SOME * 4, target + SOME * 4, set);
+}
 
 /// Reads and writes all memory once, which is what it takes its time for. `set` has the bits that are set in
 /// each pixel. Compilers have to see where source and target are one.
@@ -191,7 +222,7 @@ struct TurnLoop {
         }
         std::size_t done = 0;
         for (; count >= PIXELS_OF_LONG_ROW && done + PIXELS_PER_LINE <= count; done += PIXELS_PER_LINE)
-            TurnLine(source + done * 4, target + done * 4, set);
+            TurnLine<Order, ThroughCache>(source + done * 4, target + done * 4, set);
         for (; done < count; ++done)
             TurnOne(source, target, done, set);
     }
@@ -200,21 +231,6 @@ private:
     [[gnu::always_inline]] static void TurnOne(const std::uint8_t* source, std::uint8_t* target,
                                                std::size_t index, std::uint32_t set) {
         WritePixel(target, index, Order::Turned(ReadPixel(source, index)) | set);
-    }
-
-    /// One line is asked for at a time: of several at once, the next pixels have to wait for all.
-    [[gnu::always_inline]] static void TurnLine(const std::uint8_t* source, std::uint8_t* target,
-                                                std::uint32_t set) {
-        FetchAhead<true>(target, BYTES_AHEAD);
-        TurnSome(source, target, set);
-        TurnSome(source + SOME * 4, target + SOME * 4, set);
-    }
-
-    [[gnu::always_inline]] static void TurnSome(const std::uint8_t* source, std::uint8_t* target,
-                                                std::uint32_t set) {
-        SomePixels pixels = *reinterpret_cast<const SomePixels*>(source);
-        Order::Turn(pixels);
-        *reinterpret_cast<SomePixels*>(target) = pixels | set;
     }
 };
 
@@ -228,7 +244,7 @@ struct TurnPastCacheLoop {
         TurnLoop<Order>::Run(source, target, before, set);
         std::size_t done = before;
         for (; done + PIXELS_PER_LINE <= count; done += PIXELS_PER_LINE)
-            TurnLine(source + done * 4, target + done * 4, set);
+            TurnLine<Order, PastCache>(source + done * 4, target + done * 4, set);
         TurnLoop<Order>::Run(source + done * 4, target + done * 4, count - done, set);
     }
 
@@ -240,21 +256,6 @@ private:
         const auto address = reinterpret_cast<std::uintptr_t>(target);
         const std::size_t bytes = (0 - address) % BYTES_PER_LINE;
         return bytes % 4 == 0 ? bytes / 4 : SIZE_MAX;
-    }
-
-    [[gnu::always_inline]] static void TurnLine(const std::uint8_t* source, std::uint8_t* target,
-                                                std::uint32_t set) {
-        FetchAhead<false>(source, BYTES_AHEAD_PAST_CACHE);
-        TurnSome(source, target, set);
-        TurnSome(source + SOME * 4, target + SOME * 4, set);
-    }
-
-    [[gnu::always_inline]] static void TurnSome(const std::uint8_t* source, std::uint8_t* target,
-                                                std::uint32_t set) {
-        SomePixels pixels = *reinterpret_cast<const SomePixels*>(source);
-        Order::Turn(pixels);
-        pixels |= set;
-        WritePastCache(pixels, target);
     }
 };
 
