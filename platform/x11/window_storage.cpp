@@ -290,7 +290,7 @@ std::size_t WindowStorage::AskAheadForPart(SharedPixelsPool& pool) {
         return 0;
     RowsRead read = RowsRead::Ask(m_connection, Pixmap(), likely.left, likely.top, width, likely.bottom,
                                   *block, 0, m_pixels.pixels.BytesPerPixel());
-    m_ahead.emplace(PixelsAhead{likely, std::move(block), std::move(read), m_renewals});
+    m_ahead.emplace(PixelsAhead{likely, false, std::move(block), std::move(read), m_renewals});
     return bytes;
 }
 
@@ -303,7 +303,7 @@ std::size_t WindowStorage::AskAheadForRows() {
     const std::size_t offset = static_cast<std::size_t>(rows.top) * m_pixels.Stride();
     RowsRead read = RowsRead::Ask(m_connection, Pixmap(), 0, rows.top, m_width, rows.bottom, *m_pixels.block,
                                   offset, m_pixels.pixels.BytesPerPixel());
-    m_ahead.emplace(PixelsAhead{rows, nullptr, std::move(read), m_renewals});
+    m_ahead.emplace(PixelsAhead{rows, true, m_pixels.block, std::move(read), m_renewals});
     return static_cast<std::size_t>(rows.bottom - rows.top) * m_pixels.Stride();
 }
 
@@ -324,7 +324,7 @@ void WindowStorage::DropAhead() {
     std::optional<PixelsAhead> ahead = std::exchange(m_ahead, std::nullopt);
     if (!ahead)
         return;
-    if (ahead->block == nullptr)
+    if (ahead->isOfRows)
         m_damage.Add(ahead->rect);
     ahead->read.Finish(m_connection);
 }

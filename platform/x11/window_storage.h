@@ -44,8 +44,11 @@ std::shared_ptr<Picture> PictureOf(const ServerPixels& pixels, const std::shared
 /// Pixels that are asked for before it is known where a storage was damaged.
 struct PixelsAhead {
     PixelRect rect;
-    std::shared_ptr<SharedPixels> block; ///< Takes them from its beginning, without gaps; null for whole
-                                         ///< rows, which go where they belong.
+    /// Whole rows, which go to where they belong in the storage's own pixels.
+    bool isOfRows;
+    /// Else it takes them from its beginning, without gaps. It is there until the read has ended or nobody
+    /// waits for it any more.
+    std::shared_ptr<SharedPixels> block;
     RowsRead read;
     unsigned renewals; ///< When they were asked for.
 };

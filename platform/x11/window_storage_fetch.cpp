@@ -75,11 +75,12 @@ void StorageFetch::TakeAhead(PixelsAhead ahead) {
     m_bytesAskedFor +=
         m_pixels.BytesPerRow(rect.right - rect.left) * static_cast<std::size_t>(rect.bottom - rect.top);
     m_result = m_storage->TakePixels();
-    const bool isOfRows = ahead.block == nullptr;
-    m_pieces.push_back({rect, isOfRows, 0, std::move(ahead.read)});
+    m_pieces.push_back({rect, ahead.isOfRows, 0, std::move(ahead.read)});
+    // Whole rows are on their way to the result's own memory, which nobody else had.
+    if (ahead.isOfRows)
+        return;
     m_narrow = std::move(ahead.block);
-    // Whole rows are on their way to this memory, which nobody else had.
-    m_failed = !isOfRows && !TakeMemory();
+    m_failed = !TakeMemory();
 }
 
 void StorageFetch::Plan(const PixelRegion& damage) {

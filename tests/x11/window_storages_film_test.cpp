@@ -1,5 +1,6 @@
 // SPDX-License-Identifier: Apache-2.0
 #include "platform/picture_changes.h"
+#include "platform/x11/x11_failure.h"
 #include "tests/x11/storages_bench.h"
 
 // A film in a window: the rows that were painted time and again are read to where they belong, with the
@@ -160,6 +161,22 @@ TEST(WindowStorages, ShowAWindowAsItIsThatWasResizedDuringItsFilm) {
         film.bench.Storages().AskAhead();
         return IsAll(film.Take(), RED);
     }));
+}
+
+TEST(WindowStorages, GoOnWithAFilmAfterTheServerHasNotAnsweredInTime) {
+    Film film;
+    film.Paint(0xFF0000);
+    film.bench.Server().Stop();
+    EXPECT_EQ(film.bench.Storages().AskAhead(), ROW_BYTES);
+    film.bench.Connection().SetDeadline(CmSteadyNow() + std::chrono::milliseconds(20));
+    WindowPictureRequest request;
+    request.windows = {film.window};
+    request.rect = {{0, 0}, {300, 300}};
+    EXPECT_THROW(film.bench.Storages().Take(request, film.bench.Tree(), {}, [&] { film.bench.CatchUp(); }),
+                 Unanswered);
+    film.bench.Server().Continue();
+    film.bench.Connection().SetDeadline(CmSteadyNow() + PATIENCE);
+    EXPECT_EQ(CountOf(*film.Take(), RED), FILM_AREA);
 }
 
 TEST(WindowStorages, ShowNoFilmOfAWindowThatIsGone) {
