@@ -89,9 +89,10 @@ std::unique_ptr<FrameWriter> Capture::MakeWriter() {
 EngineAnswer Capture::Prepare() {
     if (const std::string problem = ProblemBeforeLook(); !problem.empty())
         return {EXIT_CODE_FAILED, problem};
+    const DesktopLook look;
     if (const std::string misfit = CompleteRequest(m_options.request); !misfit.empty()) {
         // What isn't there may only have gone with everything else.
-        const std::string problem = ProblemAfterLook();
+        const std::string problem = look.ProblemSince();
         return {EXIT_CODE_FAILED, problem.empty() ? misfit : problem};
     }
     m_engine.reset(CreateShareCaptureEngine(EngineTypeOf(m_options.request)));

@@ -88,6 +88,7 @@ WriteResult Demo::Begin() {
 }
 
 WriteResult Demo::Capture() {
+    const DesktopLook look;
     for (const std::string& name : CaptureModeNames()) {
         if (m_signals.IsRaised())
             break;
@@ -96,7 +97,7 @@ WriteResult Demo::Capture() {
         const PixelTally tally = TallyPixels(shot.picture.get());
         m_findings.shots.push_back({std::move(shot), tally});
         m_status.Clear();
-        if (const std::string problem = ProblemAfterLook(); !problem.empty())
+        if (const std::string problem = look.ProblemSince(); !problem.empty())
             return WriteFailure{EXIT_CODE_FAILED, problem};
     }
     return std::nullopt;

@@ -132,8 +132,9 @@ std::optional<std::string> WhyScene(const DemoOptions& options) {
 WriteResult ChooseOnDesktop(const DemoOptions& options, DemoSubject& subject) {
     if (options.excludedWindow)
         subject.request.excludedWindows = {*options.excludedWindow};
+    const DesktopLook look;
     if (const std::string misfit = CompleteRequest(subject.request); !misfit.empty()) {
-        const std::string problem = ProblemAfterLook();
+        const std::string problem = look.ProblemSince();
         return WriteFailure{EXIT_CODE_FAILED, problem.empty() ? misfit : problem};
     }
     const std::vector<ListedMonitor> monitors = ListMonitors();

@@ -5,16 +5,24 @@
 
 namespace {
 
-std::string ProblemOfLife(const std::string& lost) {
-    switch (platform::CurrentWindowServer()->GetLife().life) {
+std::string Problem(const std::string& what) {
+    return what + " (screenshare doctor tells more)";
+}
+
+std::string ProblemOfLife(platform::Life life, const std::string& lost) {
+    switch (life) {
         case platform::Life::Alive:
             return "";
         case platform::Life::Stalled:
-            return "the window server does not answer (screenshare doctor tells more)";
+            return Problem("the window server does not answer");
         case platform::Life::Lost:
             break;
     }
-    return lost + " (screenshare doctor tells more)";
+    return Problem(lost);
+}
+
+platform::LifeState LifeNow() {
+    return platform::CurrentWindowServer()->GetLife();
 }
 
 } // namespace
@@ -28,9 +36,13 @@ std::string ProblemOfNoDesktop() {
 
 std::string ProblemBeforeLook() {
     const std::string problem = ProblemOfNoDesktop();
-    return problem.empty() ? ProblemOfLife("no window server answers") : problem;
+    return problem.empty() ? ProblemOfLife(LifeNow().life, "no window server answers") : problem;
 }
 
-std::string ProblemAfterLook() {
-    return ProblemOfLife("the window server went away");
+DesktopLook::DesktopLook() : m_epoch(LifeNow().epoch) {}
+
+std::string DesktopLook::ProblemSince() const {
+    const std::string gone = "the window server went away";
+    const platform::LifeState now = LifeNow();
+    return now.epoch == m_epoch ? ProblemOfLife(now.life, gone) : Problem(gone);
 }

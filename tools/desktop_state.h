@@ -1,6 +1,7 @@
 // SPDX-License-Identifier: Apache-2.0
 #pragma once
 
+#include <cstdint>
 #include <string>
 
 /// Whether there is a window server to look at. Each gives what is wrong, for people; nothing when all is
@@ -10,5 +11,16 @@
 std::string ProblemOfNoDesktop();
 /// The same, and it has to answer.
 std::string ProblemBeforeLook();
-/// After a look that found less than there should be: the server may have gone meanwhile.
-std::string ProblemAfterLook();
+
+/// A look at the desktop that may find less than there should be because the server goes away meanwhile.
+class DesktopLook {
+public:
+    /// Begins it.
+    DesktopLook();
+    /// What is wrong since then. A server that has come back is another one: what was looked for went with
+    /// the first.
+    std::string ProblemSince() const;
+
+private:
+    const std::uint64_t m_epoch;
+};

@@ -29,10 +29,11 @@ WriteResult WriteWholeFile(const std::string& file, const std::string& text) {
 WriteResult ExplainInto(const std::string& file, ExplainForm form, ShareRequest request) {
     if (std::string problem = ProblemBeforeLook(); !problem.empty())
         return NotExplained(std::move(problem));
+    const DesktopLook look;
     const std::string misfit = CompleteRequest(request);
     const Explanation explanation = misfit.empty() ? Explain(request) : Explanation();
     // What isn't there may only have gone with everything else.
-    if (std::string problem = ProblemAfterLook(); !problem.empty())
+    if (std::string problem = look.ProblemSince(); !problem.empty())
         return NotExplained(std::move(problem));
     if (!misfit.empty())
         return NotExplained(misfit);

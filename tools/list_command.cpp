@@ -32,8 +32,9 @@ std::string ListText(const ListKind& list, ListForm form) {
 WriteResult PrintList(const ListKind& list, ListForm form) {
     if (std::string problem = ProblemBeforeLook(); !problem.empty())
         return WriteFailure{EXIT_CODE_FAILED, std::move(problem)};
+    const DesktopLook look;
     const std::string text = ListText(list, form);
-    if (std::string problem = ProblemAfterLook(); !problem.empty())
+    if (std::string problem = look.ProblemSince(); !problem.empty())
         return WriteFailure{EXIT_CODE_FAILED, std::move(problem)};
     return PrintAnswer(text);
 }

@@ -81,6 +81,7 @@ private:
     bool WaitForEnd(const StopNotice& ended) const;
 
     const StopSignals m_signals;
+    const DesktopLook m_look; // before what it found
     const ThumbnailItems m_apps;
     const ThumbnailItems m_windows;
     const std::string m_folder;
@@ -89,7 +90,7 @@ private:
 
 WriteResult ThumbnailRun::Run() {
     if (m_apps.empty() && m_windows.empty()) {
-        std::string problem = ProblemAfterLook();
+        std::string problem = m_look.ProblemSince();
         return NotMade(problem.empty() ? "there is nothing to make thumbnails of" : std::move(problem));
     }
     ThumbnailItems all = m_apps;
@@ -107,7 +108,7 @@ WriteResult ThumbnailRun::RunRequests() {
     if (WriteResult failure = RunRequest(m_windows, EnumWindowThumbnail))
         return failure;
     // What has no picture may only have gone with everything else.
-    if (std::string problem = ProblemAfterLook(); m_files.MissingCount() > 0 && !problem.empty())
+    if (std::string problem = m_look.ProblemSince(); m_files.MissingCount() > 0 && !problem.empty())
         return NotMade(std::move(problem));
     return std::nullopt;
 }

@@ -9,14 +9,14 @@ readonly program=$1 limit=60 # Seconds that anything may take before it counts a
 readonly soon=10             # Seconds in which a command that has lost its display has to end.
 work=$(mktemp -d)
 server='' job='' # What runs in the background.
-dead_socket=
+traces=() # Of servers that have been killed.
 end_process() { # PID
     [[ -n $1 ]] || return
     kill -CONT "$1" 2>/dev/null
     kill -KILL "$1" 2>/dev/null
     wait "$1" 2>/dev/null
 }
-trap 'end_process "$job"; end_process "$server"; rm -rf "$work" ${dead_socket:+"$dead_socket"}' EXIT
+trap 'end_process "$job"; end_process "$server"; rm -rf "$work" "${traces[@]}"' EXIT
 unset SCREENSHARE_TRACE DISPLAY WAYLAND_DISPLAY XDG_SESSION_TYPE
 export SCREENSHARE_PLATFORM=x11 SCREENSHARE_DEBUG_DIR=$work XAUTHORITY=$work/authority
 
@@ -39,18 +39,18 @@ start_server() {
     exec 7>&-
     export DISPLAY=:$number
 }
+# The number of a dead server is anybody's: in its lock stands a process that lives on.
+keep_number() {
+    local number=${DISPLAY#:}
+    traces+=("/tmp/.X$number-lock" "/tmp/.X11-unix/X$number")
+    printf '%10d\n' $$ >"$work/lock"
+    mv -f "$work/lock" "/tmp/.X$number-lock"
+}
 kill_server() {
+    keep_number
     kill -KILL "$server"
     wait "$server" 2>/dev/null
     server=''
-}
-# The number of a dead server is anybody's: this is another one that looks the same, and that no server takes.
-use_dead_display() {
-    local number=$((20000 + $$))
-    dead_socket=/tmp/.X11-unix/X$number
-    python3 -c 'import socket, sys; socket.socket(socket.AF_UNIX).bind(sys.argv[1])' "$dead_socket" ||
-        fail "no socket"
-    export DISPLAY=:$number
 }
 
 run() { timeout $soon "$program" "$@" </dev/null >"$work/out" 2>"$work/err"; }
@@ -105,7 +105,6 @@ readonly lookers=('list apps' 'list windows --json' 'list monitors' 'thumbnails 
 case_killed_before() {
     start_server
     kill_server
-    use_dead_display
     cd "$work" || exit 1
     local command
     for command in "${lookers[@]}"; do
@@ -201,8 +200,9 @@ case_stopped_while_capturing() {
     done
 }
 
-# The pipe has room for the headings; the first line waits for a reader, and the server goes meanwhile.
-case_killed_while_thumbnails_are_written() {
+# The pipe has room for the headings; the first line waits for a reader, and the server goes meanwhile. RETURNS is 1 when
+# another one comes in its place.
+lose_server_between_thumbnails() { # RETURNS
     local each
     for each in python3 xclock xwininfo; do
         command -v $each >/dev/null || { echo "skipped: $each is not installed"; exit 77; }
@@ -214,9 +214,10 @@ case_killed_while_thumbnails_are_written() {
     xclock -geometry 100x100+210+10 -title second >"$work/log" 2>&1 &
     wait_for_window first
     wait_for_window second
-    timeout $limit python3 - "$program" "$work/pictures" "$server" 2>"$work/err" <<'END'
+    keep_number
+    timeout $limit python3 - "$program" "$work/pictures" "$server" "$1" 2>"$work/err" <<'END'
 import fcntl, glob, os, signal, subprocess, sys, time
-program, folder, server = sys.argv[1:]
+program, folder, server, returns = sys.argv[1:]
 F_SETPIPE_SZ = 1031
 reader, writer = os.pipe()
 fcntl.fcntl(writer, F_SETPIPE_SZ, 4096)
@@ -226,16 +227,36 @@ while not glob.glob(folder + "/*.png"):
     assert child.poll() is None, "it ends without a picture"
     time.sleep(0.05)
 os.kill(int(server), signal.SIGKILL)
-time.sleep(0.5)
+second = None
+if returns == "1":
+    display = os.environ["DISPLAY"]
+    os.remove(f"/tmp/.X{display[1:]}-lock")
+    second = subprocess.Popen(["Xvfb", display, "-displayfd", "1", "-noreset", "-nolisten", "tcp"],
+                              stdout=subprocess.PIPE, stderr=subprocess.DEVNULL)
+    second.stdout.readline()
+    time.sleep(1) # It is looked for after 0.1, 0.3 and 0.7 s.
+else:
+    time.sleep(0.5)
 while os.read(reader, 4096):
     pass
-sys.exit(child.wait(10))
+code = child.wait(10)
+if second:
+    second.terminate()
+    second.wait(10)
+sys.exit(code)
 END
     local code=$?
     [[ $code -eq 1 ]] || fail "it ends with $code and not with 1"
     grep -qF '1 without a picture' "$work/err" || fail "it does not count what is missing"
     grep -qxF 'screenshare: the window server went away (screenshare doctor tells more)' "$work/err" ||
         fail "it does not say why"
+}
+case_killed_while_thumbnails_are_written() {
+    lose_server_between_thumbnails 0
+}
+# What was to be looked at isn't there.
+case_replaced_while_thumbnails_are_written() {
+    lose_server_between_thumbnails 1
 }
 wait_for_window() { # TITLE
     local tries
