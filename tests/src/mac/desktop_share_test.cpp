@@ -393,7 +393,9 @@ TEST_P(DesktopShare, ComesBackWithTheMonitorThatWasUnplugged) {
     EXPECT_EQ(client->GetCaptureStatus(), SHARE_CAPTURE_ENGINE_STATUS_STARTED);
 
     NEEDS(m_desk->PlugInAgain(side));
-    ASSERT_TRUE(RunUntil([&] { return client.sink.FrameCount() > before; }));
+    // A frame has no pixels as long as the capturer hasn't been told that its display has a size again.
+    ASSERT_TRUE(
+        RunUntil([&] { return client.sink.FrameCount() > before && client.Last().Size() != TVLSize{}; }));
     EXPECT_EQ(client.Last().Size(), SIDE_SIZE);
     EXPECT_EQ(client.Last().meta.rectCapture, SideRect(100, 60));
     EXPECT_EQ(client.Last().Count(RED), 0) << "wherever the windows are meanwhile";
