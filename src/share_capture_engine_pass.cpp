@@ -33,11 +33,12 @@ bool IsSameData(IShareFrame& a, IShareFrame& b) {
 /// there itself: others may write what they like, and our own ones may be inside theirs.
 class FillingGuard {
 public:
-    FillingGuard(IShareFrame& frame, bool isOwnCapturer)
+    /// `partner`: a frame that may be left with what is in this one, or null.
+    FillingGuard(IShareFrame& frame, bool isOwnCapturer, IShareFrame* partner)
         : m_frame(CShareFrame::OwnOf(&frame)),
           m_isOwnCapturer(isOwnCapturer) {
         if (m_frame != nullptr)
-            m_frame->BeginFilling();
+            m_frame->BeginFilling(CShareFrame::OwnOf(partner));
     }
     ~FillingGuard() {
         if (m_frame == nullptr)
@@ -175,8 +176,9 @@ bool CShareCaptureEngine::_CaptureStep(Pass& pass) {
 }
 
 int CShareCaptureEngine::_CaptureFrame(IShareCapturer& capturer, IShareFrame* frame) {
-    const FillingGuard filling(*frame,
-                               m_eSHARE_CAPTURE_ENGINE_TYPE != SHARE_CAPTURE_ENGINE_TYPE_USER_CUSTOMIZATION);
+    const bool isOwnCapturer = m_eSHARE_CAPTURE_ENGINE_TYPE != SHARE_CAPTURE_ENGINE_TYPE_USER_CUSTOMIZATION;
+    // Who holds back duplicates compares the frame with the one before, which then has to stay as it is.
+    const FillingGuard filling(*frame, isOwnCapturer, m_bCheckDupFrame ? nullptr : _GetPreShareFrame());
     ShareDumpTimeUsage usage;
     int result = SHARE_CAPTURE_FAILED;
     try {

@@ -339,8 +339,24 @@ void CShareFrame::DropNoteOf(IShareFrame& frame) {
     }
 }
 
+void CShareFrame::BeginFilling(CShareFrame* partner) {
+    m_bNoteIsOfThisFilling = false;
+    m_pPartner = partner;
+}
+
 void CShareFrame::EndFilling() {
+    m_pPartner = nullptr;
     if (!m_bNoteIsOfThisFilling) {
         _DropNote();
     }
+}
+
+bool CShareFrame::ChangeWithPartner(std::uint64_t noteNumber) {
+    const bool isThere = m_pPartner != nullptr && noteNumber != 0 && m_pPartner->NoteNumber() == noteNumber;
+    if (!isThere || !AllowsNote()) {
+        return false;
+    }
+    _SwapFields(*m_pPartner);
+    ConfirmNote();
+    return true;
 }

@@ -96,8 +96,13 @@ public:
     static void DropNoteOf(IShareFrame& frame);
 
     /// Between these two somebody fills the frame. A note that he hasn't put there is none of his pixels.
-    void BeginFilling() { m_bNoteIsOfThisFilling = false; }
+    /// `partner`: another frame, or null, that nobody looks at any more; it may be left with what is in this
+    /// one. It has to last that long.
+    void BeginFilling(CShareFrame* partner = nullptr);
     void EndFilling();
+    /// Fills it with what its partner shows, if that has a note of this number: they change their pixels and
+    /// all that belongs to them. False if it doesn't, or there is no partner.
+    bool ChangeWithPartner(std::uint64_t noteNumber);
 
     void SetMetaInfo(const MetaInfo& info) override { m_metaInfo = info; }
     MetaInfo GetMetaInfo() const override { return m_metaInfo; }
@@ -137,4 +142,5 @@ private:
     std::unique_ptr<ShareFrameNote> m_pNote;
     bool m_bAllowsNote = false;
     bool m_bNoteIsOfThisFilling = false;
+    CShareFrame* m_pPartner = nullptr; // while it is being filled
 };

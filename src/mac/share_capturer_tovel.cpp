@@ -42,7 +42,7 @@ bool ShareCapturerTovel::CaptureShort(IShareFrame& frame) {
     const std::lock_guard<std::mutex> lock(m_bmpContextLock);
     bool isDone = false;
     if (platform::CGWindowServerGetMoment() == m_standing.Moment())
-        isDone = m_standing.IsIn(frame) || m_cgsCapturer->captureAgain(frame);
+        isDone = m_standing.PutInto(frame) || m_cgsCapturer->captureAgain(frame);
     if (!isDone)
         isDone = CaptureSameWindows(frame, *terms);
     if (isDone)

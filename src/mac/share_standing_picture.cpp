@@ -28,11 +28,14 @@ std::optional<ShareStandingPicture::Terms> ShareStandingPicture::TermsOf(
     return terms;
 }
 
-bool ShareStandingPicture::IsIn(IShareFrame& frame) const {
+bool ShareStandingPicture::PutInto(IShareFrame& frame) const {
     CShareFrame* const own = CShareFrame::OwnOf(&frame);
-    if (own == nullptr || !own->AllowsNote() || own->NoteNumber() != m_nNote)
+    if (own == nullptr)
         return false;
-    own->ConfirmNote();
+    if (own->NoteNumber() == m_nNote)
+        own->ConfirmNote();
+    else if (!own->ChangeWithPartner(m_nNote))
+        return false;
     own->SetMetaInfo(m_meta);
     return true;
 }

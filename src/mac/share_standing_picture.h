@@ -45,8 +45,9 @@ public:
     bool IsOf(const Terms& terms) const { return m_nMoment != 0 && terms == m_terms; }
     /// The window server's when it was taken; 0 without a picture.
     std::uint64_t Moment() const { return m_nMoment; }
-    /// Whether a frame shows it. If so, that counts as a filling of the frame.
-    bool IsIn(IShareFrame& frame) const;
+    /// Whether a frame shows it, or can have it from its partner. If so, that counts as a filling of the
+    /// frame.
+    bool PutInto(IShareFrame& frame) const;
 
     /// A picture was made on these terms, all along, and the frame shows it. `moment` is the window server's.
     void Keep(IShareFrame& frame, const Terms& terms, std::uint64_t moment);

@@ -6,7 +6,9 @@
 
 #include <gtest/gtest.h>
 
+#include <cstdint>
 #include <memory>
+#include <utility>
 
 /// Which notes of capturers on what a frame shows are believed.
 
@@ -26,6 +28,40 @@ bool HasNote(IShareFrame* frame) {
 }
 
 using CDesktopBench = CEngineBench<CShareCaptureDesktopEngine>;
+
+constexpr std::uint64_t NUMBER = 7;
+
+void PutNumberedNote(IShareFrame* frame) {
+    auto note = std::make_unique<CSomeNote>();
+    note->SetNumber(NUMBER);
+    dynamic_cast<CShareFrame&>(*frame).PutNote(std::move(note));
+}
+
+bool ChangeWithPartner(IShareFrame* frame) {
+    return dynamic_cast<CShareFrame&>(*frame).ChangeWithPartner(NUMBER);
+}
+
+/// Whether a capturer can have a picture that is in the frame before.
+template <class Bench>
+bool HasFromTheFrameBefore(Bench& bench) {
+    bench.BeginInline();
+    bench.Passes(2);
+    IShareFrame* const before = bench.engine->_GetCurShareFrame();
+    bench.capturer.SetHook(PutNumberedNote);
+    bench.capturer.SetFill(9); // no duplicate
+    bench.Pass();
+    const unsigned char* const pixels = before->GetFrameData();
+    IShareFrame* const frame = bench.engine->_GetCurShareFrame();
+    EXPECT_NE(frame, before);
+    bool isHad = false;
+    bench.capturer.SetHook([&isHad](IShareFrame* each) { isHad = ChangeWithPartner(each); });
+    bench.Pass();
+    EXPECT_EQ(frame->GetFrameData() == pixels, isHad);
+    EXPECT_NE(before->GetFrameData(), frame->GetFrameData());
+    PutNumberedNote(before);
+    EXPECT_FALSE(ChangeWithPartner(frame)) << "the pass is over";
+    return isHad;
+}
 
 } // namespace
 
@@ -79,6 +115,22 @@ TEST(ShareEngineNotes, ThatAreTheSameMakeDuplicates) {
     const std::size_t before = bench.sink.FrameCount();
     bench.Passes(3);
     EXPECT_EQ(bench.sink.FrameCount(), before + 1) << "the one before had no note";
+}
+
+TEST(ShareEngineNotes, AreHadWithThePixelsFromTheFrameBefore) {
+    CDesktopBench bench;
+    EXPECT_TRUE(HasFromTheFrameBefore(bench));
+}
+
+TEST(ShareEngineNotes, StayWithTheFrameThatTheNextOneIsComparedWith) {
+    CDesktopBench bench;
+    bench.engine->m_bCheckDupFrame = true;
+    EXPECT_FALSE(HasFromTheFrameBefore(bench));
+}
+
+TEST(ShareEngineNotes, AreNotHadByACapturerOfTheClient) {
+    CEngineBench<> bench;
+    EXPECT_FALSE(HasFromTheFrameBefore(bench));
 }
 
 TEST(ShareEngineNotes, AreDroppedWithThePointerThatIsComposed) {

@@ -26,6 +26,7 @@
 #include <memory>
 #include <ostream>
 #include <string>
+#include <vector>
 
 // What captures leave undone on a desktop at rest, if its window server tells that it is.
 
@@ -61,8 +62,9 @@ struct CStandingBench {
     }
 
     CShareFrame& Frame(std::size_t which = 0) { return *frames[which].Get(); }
-    unsigned Capture(std::size_t which = 0) {
-        Frame(which).BeginFilling();
+    /// With a partner, it may take over what is in the other frame.
+    unsigned Capture(std::size_t which = 0, bool hasPartner = false) {
+        Frame(which).BeginFilling(hasPartner ? &Frame(1 - which) : nullptr);
         const unsigned result = backEnd.captureToIShareFrame(&Frame(which));
         Frame(which).EndFilling();
         return result;
@@ -74,9 +76,9 @@ struct CStandingBench {
                desktop->CallsOf(SimulatedOperation::GetPointerPosition);
     }
     /// Whether a capture asks the desktop for anything.
-    bool Asks(std::size_t which = 0) {
+    bool Asks(std::size_t which = 0, bool hasPartner = false) {
         const unsigned before = Questions();
-        Capture(which);
+        Capture(which, hasPartner);
         return Questions() != before;
     }
     /// Windows that have moved come to rest.
@@ -193,6 +195,62 @@ TEST_F(StandingPicture, IsDrawnOnceIntoEachFrame) {
     EXPECT_EQ(std::memcmp(Frame(0).GetFrameData(), Frame(1).GetFrameData(),
                           static_cast<std::size_t>(CShareFrame::BackedDataLen(Frame(1)))),
               0);
+}
+
+TEST_F(StandingPicture, IsHadFromThePartnerInsteadOfBeingDrawn) {
+    Rest();
+    EXPECT_FALSE(Asks(1));
+    for (const std::uint32_t rgb : {0x112233U, 0x445566U, 0x778899U}) {
+        desktop->SetContent(WINDOW, SimulatedContent::Colour(rgb));
+        ASSERT_EQ(Capture(0, true), 0u);
+        const unsigned char* const drawn = Frame(0).GetFrameData();
+        const unsigned char* const former = Frame(1).GetFrameData();
+        clock->Advance(ms(33));
+        EXPECT_FALSE(Asks(1, true));
+        EXPECT_EQ(Frame(1).GetFrameData(), drawn);
+        EXPECT_EQ(Frame(1).GetTimestamp(), ShareUtil::GetCaptureFrameTimeStamp());
+        EXPECT_EQ(Frame(1).GetMetaInfo().rectCapture, (TVLRect{0, 0, 120, 80}));
+        EXPECT_EQ(PixelAt(Frame(1), 20, 20), Rgb(rgb));
+        EXPECT_EQ(Frame(0).GetFrameData(), former) << "the partner has this one's";
+        EXPECT_NE(PixelAt(Frame(0), 20, 20), Rgb(rgb));
+        EXPECT_FALSE(Asks(0, true)) << "and back";
+        EXPECT_EQ(Frame(0).GetFrameData(), drawn);
+        EXPECT_FALSE(Asks(0, true)) << "it has it itself";
+        EXPECT_EQ(Frame(0).GetFrameData(), drawn);
+    }
+}
+
+TEST_F(StandingPicture, IsHadFromAPartnerOfAnotherSize) {
+    Rest();
+    Frame(1).SetFrameSize(10, 10);
+    EXPECT_FALSE(Asks(1, true));
+    EXPECT_EQ(SizeOf(Frame(1)), (TVLSize{120, 80}));
+    EXPECT_EQ(SizeOf(Frame(0)), (TVLSize{10, 10}));
+    EXPECT_EQ(PixelAt(Frame(1), 20, 20), Rgb(0x00FF00));
+}
+
+TEST_F(StandingPicture, IsNotHadFromAPartnerThatShowsAnother) {
+    Rest();
+    EXPECT_FALSE(Asks(1));
+    desktop->SetContent(WINDOW, SimulatedContent::Colour(0x112233));
+    const unsigned char* const pixels = Frame(0).GetFrameData();
+    EXPECT_TRUE(Asks(0, true));
+    EXPECT_EQ(Frame(0).GetFrameData(), pixels) << "drawn";
+    EXPECT_EQ(PixelAt(Frame(0), 20, 20), Rgb(0x112233));
+}
+
+TEST_F(StandingPicture, IsDrawnWhereAFrameHasMemoryOfTheClient) {
+    for (const std::size_t owner : {std::size_t{0}, std::size_t{1}}) {
+        CStandingBench bench;
+        std::vector<unsigned char> memory(std::size_t{120} * 80 * 4);
+        bench.Rest();
+        ASSERT_EQ(bench.Frame(owner).SetExternalBuf(memory.data(), static_cast<int>(memory.size())), 0);
+        for (const std::size_t which : {std::size_t{0}, std::size_t{1}, std::size_t{0}}) {
+            EXPECT_EQ(bench.Capture(which, true), 0u);
+            EXPECT_EQ(bench.Frame(owner).GetFrameData(), memory.data());
+            EXPECT_EQ(PixelAt(bench.Frame(which), 20, 20), Rgb(0x00FF00));
+        }
+    }
 }
 
 TEST_F(StandingPicture, IsNotKnownWhereTheServerDoesNotTell) {
@@ -341,9 +399,12 @@ protected:
         clock->Advance(ms(m_dice.OneIn(3) ? 501 : 33));
         const auto which = static_cast<std::size_t>(m_dice.Between(0, 1));
         const unsigned before = Questions();
-        if (Capture(which) != 0)
+        const unsigned char* const others = Frame(1 - which).GetFrameData();
+        if (Capture(which, m_dice.OneIn(2)) != 0)
             return;
         ++pictures;
+        if (Frame(which).GetFrameData() == others)
+            ++had;
         if (Questions() == before)
             ++standing;
         Judge(Frame(which));
@@ -351,6 +412,7 @@ protected:
 
     int pictures = 0;
     int standing = 0;
+    int had = 0; // from the partner
 
 private:
     void ChangeShare() {
@@ -404,8 +466,9 @@ TEST_F(StandingPictureOracle, ShowsWhatIsDrawnFromScratch) {
     context->SetShareType(SHARE_TYPE_DESKTOP);
     for (int i = 0; i < steps && !HasFailure(); ++i)
         Step();
-    std::cout << steps << " steps, seed 4711: " << pictures << " pictures, " << standing
-              << " of them stood\n";
+    std::cout << steps << " steps, seed 4711: " << pictures << " pictures, " << standing << " of them stood, "
+              << had << " were the partner's\n";
     EXPECT_GT(pictures, steps / 3);
     EXPECT_GT(standing, steps / 10);
+    EXPECT_GT(had, steps / 30);
 }
