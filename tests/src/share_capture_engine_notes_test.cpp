@@ -128,6 +128,18 @@ TEST(ShareEngineNotes, StayWithTheFrameThatTheNextOneIsComparedWith) {
     EXPECT_FALSE(HasFromTheFrameBefore(bench));
 }
 
+TEST(ShareEngineNotes, WithoutANumberAreNotHadFromTheFrameBefore) {
+    CDesktopBench bench;
+    bench.BeginInline();
+    bench.capturer.SetHook(PutNote);
+    bench.Passes(2);
+    bool isHad = true;
+    bench.capturer.SetHook(
+        [&isHad](IShareFrame* frame) { isHad = dynamic_cast<CShareFrame&>(*frame).ChangeWithPartner(0); });
+    bench.Pass();
+    EXPECT_FALSE(isHad);
+}
+
 TEST(ShareEngineNotes, AreNotHadByACapturerOfTheClient) {
     CEngineBench<> bench;
     EXPECT_FALSE(HasFromTheFrameBefore(bench));
