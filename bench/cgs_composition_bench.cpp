@@ -117,6 +117,7 @@ struct Case {
     CGWindowID window; // 0: none paints
     PixelRect painted;
     bool keepsNotes;
+    TVLSize size = SIZE; // of the frame
 };
 
 void Compose(benchmark::State& state, const Case& each) {
@@ -131,12 +132,12 @@ void Compose(benchmark::State& state, const Case& each) {
         if (each.keepsNotes)
             frame.Get()->AllowNote();
         for (int i = 0; i < 2; ++i)
-            capturer.capture(frame.Get(), DISPLAY, SIZE, SIZE);
+            capturer.capture(frame.Get(), DISPLAY, each.size, each.size);
     }
     const long before = g_allocations.load();
     std::size_t next = 0;
     while (state.KeepRunning()) {
-        if (capturer.capture(frames[next].Get(), DISPLAY, SIZE, SIZE) != SHARE_CAPTURE_OK)
+        if (capturer.capture(frames[next].Get(), DISPLAY, each.size, each.size) != SHARE_CAPTURE_OK)
             state.SkipWithError("no picture");
         next = 1 - next;
     }
@@ -150,6 +151,10 @@ constexpr Case CASES[] = {
     {"video", VIDEO, {0, 0, 1280, 720}, true},
     {"all", WALLPAPER, {0, 0, WIDTH, HEIGHT}, true},
     {"from scratch", 0, {}, false},
+    {"typing, scaled to two thirds", VIDEO, {100, 100, 400, 120}, true, {1280, 720}},
+    {"video, scaled to two thirds", VIDEO, {0, 0, 1280, 720}, true, {1280, 720}},
+    {"from scratch, scaled to two thirds", 0, {}, false, {1280, 720}},
+    {"typing, scaled to a third", VIDEO, {100, 100, 400, 120}, true, {640, 360}},
 };
 
 class CIdleSink final : public IShareCaptureEngineSink {

@@ -144,15 +144,18 @@ public:
     virtual bool Succeeded() const { return true; }
 };
 
+constexpr TVLSize AS_IT_IS{WIDTH, HEIGHT};
+
 /// A pass of an engine that shares a desktop on which a window changes, or none.
 class PassStep final : public Step {
 public:
-    /// `tells` is for a window server that tells moments.
-    explicit PassStep(platform::CGWindowID changing = 0, bool tells = false)
+    /// `tells` is for a window server that tells moments. `size` is what frames are scaled to.
+    explicit PassStep(platform::CGWindowID changing = 0, bool tells = false, TVLSize size = AS_IT_IS)
         : m_served(DesktopScene()),
           m_changing(changing),
           m_engine(new InlineEngine) {
         m_engine->SelectSharedDisplay(DISPLAY);
+        m_engine->SetCaptureMaxFrameSize(size.cx, size.cy);
         m_engine->SetSink(&m_sink);
         m_engine->BelieveStarted();
         m_served.Server().TellMoments(tells);
@@ -253,6 +256,10 @@ const std::map<std::string, StepMaker>& Steps() {
         {"pass_standing", [] { return std::make_unique<PassStep>(0, true); }},
         {"pass_standing_typing", [] { return std::make_unique<PassStep>(SMALL_WINDOW, true); }},
         {"pass_typing", [] { return std::make_unique<PassStep>(SMALL_WINDOW); }},
+        {"pass_typing_scaled",
+         [] {
+             return std::make_unique<PassStep>(SMALL_WINDOW, false, TVLSize{WIDTH * 2 / 3, HEIGHT * 2 / 3});
+         }},
         {"pass_full", [] { return std::make_unique<PassStep>(WIDE_WINDOW); }},
         {"composition_full", [] { return std::make_unique<CompositionStep>(); }},
         {"walk_10", [] { return std::make_unique<WalkStep>(10, false); }},

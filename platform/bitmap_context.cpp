@@ -172,28 +172,29 @@ void DrawUnscaled(const Drawing& drawing) {
 }
 
 /// Scales into the context itself and mends the order of the bytes there, a band at a time, while it is still
-/// at hand. False when that is not possible, and nothing is drawn.
+/// at hand. False when that is not possible, and nothing is drawn. Whether it is doesn't depend on the rows
+/// that are seen, so that those of a part come out as in the whole.
 bool DrawScaledInPlace(const Drawing& drawing) {
     constexpr int ROWS_PER_BAND = 16;
     const CGContext& context = drawing.context;
     const ScaleSource& source = drawing.source;
+    const PixelBox& box = drawing.box;
+    const PixelBox& clip = drawing.clip;
     if (CGHasAlpha(drawing.layout) || context.imageAlpha != 255 || context.layout == CGPixelLayout::RGB ||
-        drawing.clip != drawing.box)
+        clip.left != box.left || clip.right != box.right || box.top < 0 ||
+        !CanScaleDownRows(source, box.Width(), box.Height()))
         return false;
-    const int width = static_cast<int>(drawing.box.Width());
-    const int height = static_cast<int>(drawing.box.Height());
-    if (!CanScaleDownRows(source, width, height))
-        return false;
-    for (int y = 0; y < height; y += ROWS_PER_BAND) {
-        const int count = std::min(height - y, ROWS_PER_BAND);
-        if (!ScaleDownRows(source, drawing.Target(drawing.box.top),
-                           static_cast<std::size_t>(context.bytesPerRow), width, height, y, count,
+    const int width = static_cast<int>(box.Width());
+    const int height = static_cast<int>(box.Height());
+    for (std::int64_t y = clip.top; y < clip.bottom; y += ROWS_PER_BAND) {
+        const std::int64_t end = std::min(y + ROWS_PER_BAND, clip.bottom);
+        if (!ScaleDownRows(source, drawing.Target(box.top), static_cast<std::size_t>(context.bytesPerRow),
+                           width, height, static_cast<int>(y - box.top), static_cast<int>(end - y),
                            drawing.Filter()))
             return false;
-        for (int i = y; i < y + count; ++i) {
-            std::uint8_t* const row = drawing.Target(drawing.box.top + i);
-            ConvertRow(drawing.layout, row, context.layout, row, drawing.Count());
-        }
+        for (std::int64_t row = y; row < end; ++row)
+            ConvertRow(drawing.layout, drawing.Target(row), context.layout, drawing.Target(row),
+                       drawing.Count());
     }
     return true;
 }
@@ -211,7 +212,7 @@ void DrawScaled(const Drawing& drawing) {
 
 /// Only pixels of 4 component bytes can be scaled, so others are turned into such first.
 void DrawScaledConverted(Drawing drawing) {
-    if (drawing.layout != CGPixelLayout::RGB && drawing.layout != CGPixelLayout::X2R10G10B10) {
+    if (CGHasFourBytes(drawing.layout)) {
         DrawScaled(drawing);
         return;
     }

@@ -93,4 +93,8 @@ bool CGHasAlpha(CGPixelLayout layout) noexcept {
     return layout == CGPixelLayout::RGBA || layout == CGPixelLayout::ARGB || layout == CGPixelLayout::BGRA;
 }
 
+bool CGHasFourBytes(CGPixelLayout layout) noexcept {
+    return layout != CGPixelLayout::RGB && layout != CGPixelLayout::X2R10G10B10;
+}
+
 } // namespace platform

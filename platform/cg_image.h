@@ -68,5 +68,7 @@ std::vector<std::uint8_t> CGDataProviderCopyData(const CGDataProviderRef& provid
 CGPixelLayout CGPixelLayoutOf(PixelFormat format) noexcept;
 std::size_t CGBytesPerPixel(CGPixelLayout layout) noexcept;
 bool CGHasAlpha(CGPixelLayout layout) noexcept;
+/// A pixel is of 4 bytes, and each of them is a component or nothing.
+bool CGHasFourBytes(CGPixelLayout layout) noexcept;
 
 } // namespace platform

@@ -125,7 +125,7 @@ void RowScaler::ScaleWidth() {
         row[i] = static_cast<std::uint8_t>(static_cast<int>(scaled[i]));
 }
 
-bool CanScaleDownRows(const ScaleSource& source, int width, int height) {
+bool CanScaleDownRows(const ScaleSource& source, std::int64_t width, std::int64_t height) {
     // Further down than below, or with a side of one pixel, libyuv leaves pixels out; and it counts in 32
     // bits.
     constexpr int SMALLEST = 2;

@@ -67,11 +67,12 @@ private:
 };
 
 /// Whether ScaleDownRows can do it: down to between a half and the whole, to a half or to a quarter.
-bool CanScaleDownRows(const ScaleSource& source, int width, int height);
+bool CanScaleDownRows(const ScaleSource& source, std::int64_t width, std::int64_t height);
 
 /// Scales a whole picture down and writes rows `first` to `first` + `count` of the result, whose top row is
-/// at `target`. With the box filter, pixels between a half and the whole are taken from the nearest ones.
-/// Much faster than RowScaler. False when it can't, and nothing is written.
+/// at `target`; they are the same whichever are written with them. With the box filter, pixels between a half
+/// and the whole are taken from the nearest ones. Much faster than RowScaler. False when it can't, and
+/// nothing is written.
 bool ScaleDownRows(const ScaleSource& source, std::uint8_t* target, std::size_t stride, int width, int height,
                    int first, int count, ScaleFilter filter) noexcept;
 

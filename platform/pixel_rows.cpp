@@ -301,10 +301,6 @@ void ContractTo3Bytes(const std::uint8_t* rgba, std::uint8_t* rgb, std::size_t c
     libyuv::ARGBToRGB24(rgba, 0, rgb, 0, static_cast<int>(count), 1);
 }
 
-bool HasFourComponentBytes(CGPixelLayout layout) {
-    return layout != CGPixelLayout::RGB && layout != CGPixelLayout::X2R10G10B10;
-}
-
 /// `alpha` has the alpha of each byte's pixel.
 struct BlendLoop {
     [[gnu::always_inline]] static void Run(const std::uint8_t* source, const std::uint8_t* alpha,
@@ -383,7 +379,7 @@ void ConvertRow(CGPixelLayout from, const std::uint8_t* source, CGPixelLayout to
     } else {
         const Order order = OrderOf(to);
         const bool isOpaque = !CGHasAlpha(from) || !CGHasAlpha(to);
-        if (HasFourComponentBytes(from)) {
+        if (CGHasFourBytes(from)) {
             Reorder<TurnLoop>(OrderOf(from), source, order, target, count, isOpaque);
         } else {
             ExpandTo4Bytes(from, source, target, count);
@@ -427,7 +423,7 @@ void DrawRow(CGPixelLayout from, const std::uint8_t* source, CGPixelLayout to, s
 
 void DrawRows(CGPixelLayout from, const PixelRowsIn& source, CGPixelLayout to, const PixelRowsOut& target,
               std::size_t count, std::size_t rows) noexcept {
-    const bool isTurned = HasFourComponentBytes(from) && !CGHasAlpha(from) && to != CGPixelLayout::RGB;
+    const bool isTurned = CGHasFourBytes(from) && !CGHasAlpha(from) && to != CGPixelLayout::RGB;
     if (!isTurned || count * rows * 4 < BYTES_OF_LARGE_PICTURE) {
         for (std::size_t y = 0; y < rows; ++y)
             DrawRow(from, source.Row(y), to, target.Row(y), count);

@@ -4,10 +4,26 @@
 #include "platform/picture_changes.h"
 #include "platform/window_image_layers.h"
 
+#include <algorithm>
 #include <cstddef>
 #include <optional>
 
 namespace platform {
+
+namespace {
+
+/// Pixels of a picture that is scaled look at others up to this far from where they stand: up, the two
+/// nearest; down, all that they take the place of, and no more than two of those around.
+constexpr std::int64_t SCALING_REACH = 2;
+/// Of windows that are scaled, more bands of rows are drawn as the one around them: each takes as long to
+/// begin as some rows do.
+constexpr std::size_t MOST_BANDS = 8;
+
+std::int64_t DivideDown(std::int64_t number, std::int64_t by) {
+    return number >= 0 ? number / by : -((-number + by - 1) / by);
+}
+
+} // namespace
 
 bool WindowImageDrawing::Layer::IsAtSamePlaceAs(const Layer& other) const {
     return window == other.window && width == other.width && height == other.height &&
@@ -57,20 +73,26 @@ bool WindowImageDrawing::AddChanges(const WindowImageDrawing& earlier, const CGW
     return true;
 }
 
+/// Where what is drawn of a part may lie: pixels, and rows of scaled ones.
+PixelBox WindowImageDrawing::Layer::PlaceOf(const PixelRect& part) const {
+    if (!IsScaled())
+        return {place.left + part.left, place.top + part.top, place.left + part.right,
+                place.top + part.bottom};
+    const std::int64_t first = DivideDown((part.top - SCALING_REACH) * place.Height(), height) - 1;
+    const std::int64_t end = DivideDown((part.bottom + SCALING_REACH) * place.Height(), height) + 2;
+    return {place.left, place.top + first, place.right, place.top + end};
+}
+
 /// Those that no window in front hides.
 bool WindowImageDrawing::AddChangesOf(std::size_t index, const Picture& picture, std::uint64_t earlier,
                                       PixelRegion& changes) const {
     const Layer& layer = m_layers[index];
     const std::optional<PixelRegion> changed = ChangesSince(picture, earlier);
-    if (!changed || layer.IsScaled())
+    if (!changed)
         return false;
     PixelRegion seen;
-    for (const PixelRect& rect : changed->Rects()) {
-        const std::int64_t x = layer.place.left;
-        const std::int64_t y = layer.place.top;
-        const PixelBox moved{x + rect.left, y + rect.top, x + rect.right, y + rect.bottom};
-        seen.Add(Seen(CommonBox(moved, layer.place)));
-    }
+    for (const PixelRect& rect : changed->Rects())
+        seen.Add(Seen(CommonBox(layer.PlaceOf(rect), layer.place)));
     for (std::size_t i = index + 1; i < m_layers.size() && !seen.IsEmpty(); ++i) {
         if (m_layers[i].IsOpaque())
             seen.Subtract(Seen(m_layers[i].place));
@@ -79,16 +101,27 @@ bool WindowImageDrawing::AddChangesOf(std::size_t index, const Picture& picture,
     return true;
 }
 
-bool WindowImageDrawing::CanDrawPart(const PixelRegion& part) const {
+bool WindowImageDrawing::IsAnyScaled() const {
+    return std::any_of(m_layers.begin(), m_layers.end(), [](const Layer& layer) { return layer.IsScaled(); });
+}
+
+std::optional<PixelRegion> WindowImageDrawing::PartFor(PixelRegion changes) const {
+    if (!IsAnyScaled())
+        return changes;
+    const PixelRect whole = Seen(m_clip);
+    PixelRegion rows;
+    for (const PixelRect& rect : changes.Rects())
+        rows.Add({std::min(rect.left, whole.left), rect.top, std::max(rect.right, whole.right), rect.bottom});
+    if (rows.Rects().size() > MOST_BANDS)
+        rows = PixelRegion(rows.Bounds());
     for (const Layer& layer : m_layers) {
-        if (!layer.IsScaled())
-            continue;
         PixelRegion touched(Seen(layer.place));
-        touched.Intersect(part);
-        if (!touched.IsEmpty())
-            return false;
+        touched.Intersect(rows);
+        // The whole picture is turned into other pixels first.
+        if (layer.IsScaled() && !CGHasFourBytes(layer.layout) && !touched.IsEmpty())
+            return std::nullopt;
     }
-    return true;
+    return rows;
 }
 
 } // namespace platform

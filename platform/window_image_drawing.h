@@ -10,6 +10,7 @@
 
 #include <cstddef>
 #include <cstdint>
+#include <optional>
 #include <vector>
 
 namespace platform {
@@ -36,9 +37,10 @@ public:
     bool AddChanges(const WindowImageDrawing& earlier, const CGWindowImage* image,
                     PixelRegion& changes) const;
 
-    /// Whether what is drawn there, clipped to it, comes out as in a drawing of the whole: windows that are
-    /// scaled are not drawn in parts. Throws std::bad_alloc.
-    bool CanDrawPart(const PixelRegion& part) const;
+    /// What has to be drawn for changes: each rectangle of it, when the drawing is clipped to it, comes out
+    /// as in a drawing of the whole. Windows that are scaled are drawn in whole rows. Nothing when all has to
+    /// be drawn. Throws std::bad_alloc.
+    std::optional<PixelRegion> PartFor(PixelRegion changes) const;
 
     bool operator==(const WindowImageDrawing&) const = default;
 
@@ -57,9 +59,11 @@ private:
         bool IsOpaque() const { return alpha >= 1.0F && !CGHasAlpha(layout) && !IsScaled(); }
         bool IsScaled() const { return place.Width() != width || place.Height() != height; }
         bool IsAtSamePlaceAs(const Layer& other) const;
+        PixelBox PlaceOf(const PixelRect& part) const;
         bool operator==(const Layer&) const = default;
     };
 
+    bool IsAnyScaled() const;
     bool AddChangesOf(std::size_t index, const Picture& picture, std::uint64_t earlier,
                       PixelRegion& changes) const;
     PixelRect Seen(const PixelBox& box) const;

@@ -2,6 +2,7 @@
 #include "src/mac/cgs_composition_note.h"
 
 #include <cstddef>
+#include <utility>
 
 namespace {
 
@@ -42,12 +43,13 @@ std::optional<platform::PixelRegion> ShareCompositionNote::ChangesSince(
         changes.Add(before.m_pointer.Rect());
         changes.Add(m_pointer.Rect());
     }
+    std::optional<platform::PixelRegion> part = m_drawing.PartFor(std::move(changes));
     // It is drawn as a whole, on windows that are drawn anew.
-    if (m_pointer.Touches(changes))
-        changes.Add(m_pointer.Rect());
-    if (!m_drawing.CanDrawPart(changes))
-        return std::nullopt;
-    return changes;
+    if (part && m_pointer.Touches(*part)) {
+        part->Add(m_pointer.Rect());
+        part = m_drawing.PartFor(*std::move(part));
+    }
+    return part;
 }
 
 platform::PixelRect ShareCompositionNote::Pointer::Rect() const {

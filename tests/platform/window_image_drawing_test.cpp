@@ -136,21 +136,48 @@ TEST_F(WindowImageDrawings, TellNothingOfOneThatIsSeenThroughAnotherClip) {
     EXPECT_EQ(Changes(before, other), std::nullopt);
 }
 
-TEST_F(WindowImageDrawings, TellNothingOfWindowsThatAreScaledAndHavePainted) {
-    const CGRect half = Rect(0, 0, 50, 30);
+TEST_F(WindowImageDrawings, TellTheRowsWhereAWindowThatIsScaledHasPainted) {
+    const CGRect half = Rect(0, 0, 50, 30); // counted from the bottom: rows 30 to 60
+    server->SetContent(2, Block({0, 0, 40, 12}));
     const WindowImageDrawing before = Now(half);
     EXPECT_EQ(Changes(before, Now(half)), PixelRegion());
-    server->SetContent(2, Block({0, 0, 1, 1}));
-    EXPECT_EQ(Changes(before, Now(half)), std::nullopt);
+    server->SetContent(2, Block({0, 0, 40, 8}));
+    // That is told of rows 0 to 16. They go to rows 40 to 48, and some of those below look at them.
+    EXPECT_EQ(Changes(before, Now(half)), PixelRegion({15, 40, 35, 51}));
 }
 
-TEST_F(WindowImageDrawings, AreDrawnInPartsOnlyWhereNothingIsScaled) {
-    EXPECT_TRUE(Now().CanDrawPart(PixelRegion({0, 0, 100, 60})));
-    const CGRect half = Rect(0, 0, 50, 30);
-    const WindowImageDrawing scaled = Now(half);
-    EXPECT_FALSE(scaled.CanDrawPart(PixelRegion({0, 40, 1, 41})));
-    EXPECT_TRUE(scaled.CanDrawPart(PixelRegion({60, 0, 100, 60}))) << "beside it";
-    EXPECT_TRUE(scaled.CanDrawPart(PixelRegion()));
+TEST_F(WindowImageDrawings, AreDrawnInPartsOfWholeRowsWhereAnythingIsScaled) {
+    const PixelRegion changes({20, 35, 30, 40});
+    EXPECT_EQ(Now().PartFor(changes), changes);
+    const WindowImageDrawing scaled = Now(Rect(0, 0, 50, 30));
+    EXPECT_EQ(scaled.PartFor(changes), PixelRegion({0, 35, 50, 40}));
+    EXPECT_EQ(scaled.PartFor(PixelRegion()), PixelRegion());
+    EXPECT_EQ(scaled.PartFor(PixelRegion({70, 35, 80, 40})), PixelRegion({0, 35, 80, 40})) << "beside them";
+}
+
+TEST_F(WindowImageDrawings, AreDrawnInFewBandsWhereAnythingIsScaled) {
+    const WindowImageDrawing scaled = Now(Rect(0, 0, 50, 30));
+    PixelRegion changes;
+    for (int i = 0; i < 8; ++i)
+        changes.Add({i, 30 + 2 * i, i + 1, 31 + 2 * i});
+    EXPECT_EQ(scaled.PartFor(changes)->Rects().size(), 8U);
+    changes.Add({0, 50, 1, 51});
+    EXPECT_EQ(scaled.PartFor(changes), PixelRegion({0, 30, 50, 51}));
+}
+
+TEST_F(WindowImageDrawings, AreDrawnAsAWholeWhereWhatIsScaledHasToBeTurnedIntoOtherPixelsFirst) {
+    server = Scene()
+                 .Display(0, 0, 100, 60)
+                 .Window(1)
+                 .At(0, 0, 100, 60)
+                 .Format(PixelFormat::X2R10G10B10)
+                 .Window(2)
+                 .At(30, 20, 40, 32)
+                 .Serve();
+    ReplaceWindowServer(server);
+    const PixelRegion top({0, 30, 50, 31});
+    EXPECT_EQ(Now(Rect(0, 0, 50, 30)).PartFor(top), std::nullopt);
+    EXPECT_EQ(Now().PartFor(top), top);
 }
 
 TEST_F(WindowImageDrawings, CanNotBeToldWithoutSomethingToDrawOn) {
