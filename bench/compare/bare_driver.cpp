@@ -1,15 +1,24 @@
 // SPDX-License-Identifier: Apache-2.0
 #include "bench/compare/driver.h"
 #include "bench/meter/bare_loop.h"
+#include "bench/meter/watching_loop.h"
 
+#include <cstddef>
 #include <cstdint>
 #include <cstdlib>
 #include <memory>
 #include <stdexcept>
+#include <string>
 
-/// The bare loop as a program of its own: whole pictures by shared memory, nothing done with them.
+/// Loops as a program of their own: one that fetches whole pictures by shared memory and does nothing with
+/// them; with --config=updates one that fetches what has changed of the screen.
 
 namespace {
+
+std::string DisplayName() {
+    const char* const name = std::getenv("DISPLAY");
+    return name != nullptr ? name : "";
+}
 
 class BareDriver final : public Driver {
 public:
@@ -24,17 +33,37 @@ public:
     int ListWindows() override { throw std::logic_error("the bare loop lists nothing"); }
 
 private:
-    static std::string DisplayName() {
-        const char* const name = std::getenv("DISPLAY");
-        return name != nullptr ? name : "";
-    }
-
     FrameProbe m_probe;
     const BareLoop m_loop; // last: it uses the probe
 };
 
+class WatchingDriver final : public Driver {
+public:
+    WatchingDriver()
+        : m_loop(DisplayName(), [this](const std::uint32_t* pixels, int width) {
+              m_probe.Saw(reinterpret_cast<const std::uint8_t*>(pixels), std::ptrdiff_t{4} * width,
+                          FrameProbe::Order::RedFirst);
+          }) {}
+
+    int Frames() const override { return m_probe.Frames(); }
+    std::uint32_t PixelAt(int x, int y) override { return m_probe.PixelAt(x, y); }
+    int ListWindows() override { throw std::logic_error("the watching loop lists nothing"); }
+
+private:
+    FrameProbe m_probe;
+    const WatchingLoop m_loop; // last: it uses the probe
+};
+
+std::unique_ptr<Driver> MakeDriver(const DriverPlan& plan) {
+    if (plan.config.empty())
+        return std::make_unique<BareDriver>(plan);
+    if (plan.config != "updates" || plan.window != 0)
+        throw std::invalid_argument("the watching loop looks at the screen");
+    return std::make_unique<WatchingDriver>();
+}
+
 } // namespace
 
 int main(int argc, char** argv) {
-    return RunDriver(argc, argv, [](const DriverPlan& plan) { return std::make_unique<BareDriver>(plan); });
+    return RunDriver(argc, argv, MakeDriver);
 }

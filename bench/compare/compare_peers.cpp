@@ -164,6 +164,8 @@ std::vector<Peer> FindPeers() {
     add("gst-launch-1.0", "gstreamer1.0-tools is not installed",
         {GstreamerPeer("gstreamer", false), GstreamerPeer("gstreamer damage", true)});
     peers.push_back(DriverPeer("bare loop", "bare_driver", none));
+    peers.push_back(DriverPeer("bare loop updates", "bare_driver", "updates"));
+    peers.back().seesCovered = false;
     return peers;
 }
 

@@ -52,10 +52,11 @@ void SharedPicture::Put(xcb_drawable_t drawable, xcb_gcontext_t context, int x, 
                       XCB_IMAGE_FORMAT_Z_PIXMAP, 0, m_segment, 0);
 }
 
-bool SharedPicture::Fetch(xcb_drawable_t drawable) const {
-    const auto asked = xcb_shm_get_image(m_connection, drawable, 0, 0, static_cast<std::uint16_t>(m_width),
-                                         static_cast<std::uint16_t>(m_height), 0xFFFFFFFFU,
-                                         XCB_IMAGE_FORMAT_Z_PIXMAP, m_segment, 0);
+bool SharedPicture::FetchPart(xcb_drawable_t drawable, int x, int y, int width, int height) const {
+    const auto asked =
+        xcb_shm_get_image(m_connection, drawable, static_cast<std::int16_t>(x), static_cast<std::int16_t>(y),
+                          static_cast<std::uint16_t>(width), static_cast<std::uint16_t>(height), 0xFFFFFFFFU,
+                          XCB_IMAGE_FORMAT_Z_PIXMAP, m_segment, 0);
     xcb_shm_get_image_reply_t* const reply = xcb_shm_get_image_reply(m_connection, asked, nullptr);
     const bool fetched = reply != nullptr;
     std::free(reply);

@@ -24,7 +24,9 @@ public:
     void Put(xcb_drawable_t drawable, xcb_gcontext_t context, int x, int y) const;
     /// The drawable's top left, with nothing done to it: what every way of taking pictures pays at least.
     /// Waits for it; false when it fails.
-    bool Fetch(xcb_drawable_t drawable) const;
+    bool Fetch(xcb_drawable_t drawable) const { return FetchPart(drawable, 0, 0, m_width, m_height); }
+    /// The same of a part, whose rows follow each other without gaps.
+    bool FetchPart(xcb_drawable_t drawable, int x, int y, int width, int height) const;
 
 private:
     xcb_connection_t* const m_connection;

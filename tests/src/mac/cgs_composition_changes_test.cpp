@@ -253,11 +253,11 @@ TEST_F(CompositionChanges, DrawsTheBackgroundUnderWhatHasChanged) {
     EXPECT_EQ(At(58, 40), Rgb(GREEN));
 }
 
-TEST_F(CompositionChanges, DrawsWindowsThatAreScaledAsAWhole) {
+TEST_F(CompositionChanges, DrawsWindowsThatAreScaledInRows) {
     EXPECT_EQ(Capture({100, 60}), 0);
     EXPECT_EQ(Painted({100, 60}), NOTHING);
     desktop->SetContent(2, WithBlock({0, 0, 4, 16}, YELLOW));
-    EXPECT_EQ(Painted({100, 60}), (TVLRect{0, 0, 100, 60}));
+    EXPECT_EQ(Painted({100, 60}), (TVLRect{0, 20, 100, 31}));
     EXPECT_EQ(Painted({100, 60}), NOTHING);
 }
 
