@@ -110,7 +110,10 @@ void X11Connection::Flush() {
 void X11Connection::LetAnswersGather(std::size_t bytes) {
     using namespace std::chrono_literals;
     constexpr std::size_t BYTES_PER_NANOSECOND = 8; // that a server copies
+    constexpr std::size_t MANY_BYTES = std::size_t{256} << 10U;
     Flush();
+    if (bytes < MANY_BYTES)
+        return;
     std::this_thread::sleep_for(250us + std::chrono::nanoseconds(bytes / BYTES_PER_NANOSECOND));
 }
 

@@ -151,9 +151,10 @@ public:
     void RoundTrip();
     /// Sends what has been asked for since the last time.
     void Flush();
-    /// The same, and sleeps for a moment: a quarter of a millisecond, and as long as it takes to copy so many
-    /// `bytes` of pixels. A server writes each answer by itself, so who waits for several is woken as often;
-    /// most of the time all of them are there behind this.
+    /// The same, and where the answers bring many `bytes` of pixels, sleeps for as long as it takes to copy
+    /// them and a quarter of a millisecond more. A server writes each answer by itself, so who waits for
+    /// several is woken as often; most of the time all of them are there behind this. Where they bring few,
+    /// they are there sooner than a sleep would end.
     void LetAnswersGather(std::size_t bytes);
 
     /// Everything that has come, in its order; null when there is nothing more. Reads the socket.
