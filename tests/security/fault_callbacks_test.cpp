@@ -357,8 +357,11 @@ TEST_F(InsideOthers, OfThumbnailsEverythingMayBeCalled) {
             if (none)
                 none->End();
         });
-        if (callback == std::string("onThumbnailError"))
+        if (callback == std::string("onThumbnailError")) {
+            // A worker that is still on its way out has its capturer already.
+            EXPECT_TRUE(ThreadEnds("scn-thumbnail"));
             none.emplace(Poor::Others, Lack::Lasting, 0); // none for a capturer
+        }
         if (callback == std::string("onAppThumbnail")) {
             EXPECT_EQ(EnumAppThumbnail(&EDITOR, 1, &takes), 0);
         } else {

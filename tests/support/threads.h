@@ -194,6 +194,28 @@ inline std::ptrdiff_t CountThreadsOfProcess() {
     return true;
 }
 
+/// Whether a thread of this process has such a name, at most 15 bytes.
+inline bool HasThread(const std::string& name) {
+    for (const auto& task : std::filesystem::directory_iterator("/proc/self/task")) {
+        std::string found;
+        std::ifstream file(task.path() / "comm");
+        if (std::getline(file, found) && found == name && !IsThreadEnding(task.path()))
+            return true;
+    }
+    return false;
+}
+
+/// False when there is still one after PATIENCE.
+[[nodiscard]] inline bool ThreadEnds(const std::string& name) {
+    const auto deadline = std::chrono::steady_clock::now() + PATIENCE;
+    while (HasThread(name)) {
+        if (std::chrono::steady_clock::now() >= deadline)
+            return false;
+        std::this_thread::yield();
+    }
+    return true;
+}
+
 /// A thread that nobody joins takes a moment to end. Gives the count that it found last.
 inline std::ptrdiff_t WaitForThreadsOfProcess(std::ptrdiff_t count) {
     const auto deadline = std::chrono::steady_clock::now() + PATIENCE;
