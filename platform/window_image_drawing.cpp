@@ -115,10 +115,12 @@ std::optional<PixelRegion> WindowImageDrawing::PartFor(PixelRegion changes) cons
     if (rows.Rects().size() > MOST_BANDS)
         rows = PixelRegion(rows.Bounds());
     for (const Layer& layer : m_layers) {
+        if (!layer.IsScaled() || CGHasFourBytes(layer.layout))
+            continue;
+        // To scale any row of it, the whole picture is turned into other pixels first.
         PixelRegion touched(Seen(layer.place));
         touched.Intersect(rows);
-        // The whole picture is turned into other pixels first.
-        if (layer.IsScaled() && !CGHasFourBytes(layer.layout) && !touched.IsEmpty())
+        if (!touched.IsEmpty())
             return std::nullopt;
     }
     return rows;

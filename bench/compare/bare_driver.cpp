@@ -20,7 +20,17 @@ std::string DisplayName() {
     return name != nullptr ? name : "";
 }
 
-class BareDriver final : public Driver {
+class LoopDriver : public Driver {
+public:
+    int Frames() const override { return m_probe.Frames(); }
+    std::uint32_t PixelAt(int x, int y) override { return m_probe.PixelAt(x, y); }
+    int ListWindows() override { throw std::logic_error("a loop lists nothing"); }
+
+protected:
+    FrameProbe m_probe;
+};
+
+class BareDriver final : public LoopDriver {
 public:
     explicit BareDriver(const DriverPlan& plan)
         : m_loop(DisplayName(), plan.window, [this](const SharedPicture& picture) {
@@ -28,16 +38,11 @@ public:
                           std::ptrdiff_t{4} * picture.Width());
           }) {}
 
-    int Frames() const override { return m_probe.Frames(); }
-    std::uint32_t PixelAt(int x, int y) override { return m_probe.PixelAt(x, y); }
-    int ListWindows() override { throw std::logic_error("the bare loop lists nothing"); }
-
 private:
-    FrameProbe m_probe;
-    const BareLoop m_loop; // last: it uses the probe
+    const BareLoop m_loop;
 };
 
-class WatchingDriver final : public Driver {
+class WatchingDriver final : public LoopDriver {
 public:
     WatchingDriver()
         : m_loop(DisplayName(), [this](const std::uint32_t* pixels, int width) {
@@ -45,13 +50,8 @@ public:
                           FrameProbe::Order::RedFirst);
           }) {}
 
-    int Frames() const override { return m_probe.Frames(); }
-    std::uint32_t PixelAt(int x, int y) override { return m_probe.PixelAt(x, y); }
-    int ListWindows() override { throw std::logic_error("the watching loop lists nothing"); }
-
 private:
-    FrameProbe m_probe;
-    const WatchingLoop m_loop; // last: it uses the probe
+    const WatchingLoop m_loop;
 };
 
 std::unique_ptr<Driver> MakeDriver(const DriverPlan& plan) {

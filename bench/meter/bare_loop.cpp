@@ -1,12 +1,8 @@
 // SPDX-License-Identifier: Apache-2.0
 #include "bench/meter/bare_loop.h"
 
-#include "bench/meter/share_cost.h"
-
 #include <xcb/composite.h>
 
-#include <algorithm>
-#include <chrono>
 #include <cstdlib>
 #include <stdexcept>
 #include <utility>
@@ -52,22 +48,13 @@ BareLoop::BareLoop(const std::string& display, xcb_window_t window,
       m_drawable(DrawableOf(m_link, window)),
       m_picture(PictureFor(m_link, m_drawable)),
       m_look(std::move(look)),
-      m_thread([this] { Run(); }) {}
+      m_thread([this] { return Tick(); }) {}
 
-BareLoop::~BareLoop() {
-    m_ended = true;
-    m_thread.join();
-}
-
-void BareLoop::Run() {
-    using Clock = std::chrono::steady_clock;
-    const auto period = std::chrono::nanoseconds(std::chrono::seconds(1)) / TICKS_PER_SECOND;
-    Clock::time_point next = Clock::now();
-    while (!m_ended && m_picture.Fetch(m_drawable)) {
-        ++m_frames;
-        if (m_look)
-            m_look(m_picture);
-        next = std::max(next + period, Clock::now());
-        std::this_thread::sleep_until(next);
-    }
+bool BareLoop::Tick() {
+    if (!m_picture.Fetch(m_drawable))
+        return false;
+    ++m_frames;
+    if (m_look)
+        m_look(m_picture);
+    return true;
 }

@@ -1,10 +1,7 @@
 // SPDX-License-Identifier: Apache-2.0
 #include "bench/meter/watching_loop.h"
 
-#include "bench/meter/share_cost.h"
-
 #include <algorithm>
-#include <chrono>
 #include <cstddef>
 #include <cstdlib>
 #include <stdexcept>
@@ -28,26 +25,15 @@ WatchingLoop::WatchingLoop(const std::string& display, Look look)
     m_link.RoundTrip();
     if (!Fetch({0, 0, m_width, m_height}))
         throw std::runtime_error("the screen can't be fetched");
-    m_thread = std::thread([this] { Run(); });
+    m_thread.emplace([this] { return Tick(); });
 }
 
-WatchingLoop::~WatchingLoop() {
-    m_ended = true;
-    m_thread.join();
-}
-
-void WatchingLoop::Run() {
-    using Clock = std::chrono::steady_clock;
-    const auto period = std::chrono::nanoseconds(std::chrono::seconds(1)) / TICKS_PER_SECOND;
-    Clock::time_point next = Clock::now();
-    while (!m_ended) {
-        const Area damaged = TakeDamage();
-        if (damaged.left < damaged.right && !Fetch(damaged))
-            return;
-        m_look(m_pixels.data(), m_width);
-        next = std::max(next + period, Clock::now());
-        std::this_thread::sleep_until(next);
-    }
+bool WatchingLoop::Tick() {
+    const Area damaged = TakeDamage();
+    if (damaged.left < damaged.right && !Fetch(damaged))
+        return false;
+    m_look(m_pixels.data(), m_width);
+    return true;
 }
 
 /// What lies around all that the server has told since the last time.

@@ -2,15 +2,15 @@
 #pragma once
 
 #include "bench/meter/shared_picture.h"
+#include "bench/meter/ticking_thread.h"
 #include "tests/x11/x11_rig.h"
 
 #include <xcb/damage.h>
 
-#include <atomic>
 #include <cstdint>
 #include <functional>
+#include <optional>
 #include <string>
-#include <thread>
 #include <vector>
 
 /// Looks thirty times a second whether the screen has changed, and fetches what has, by shared memory, into a
@@ -23,7 +23,6 @@ public:
 
     /// `look` is called on the loop's thread at each tick.
     WatchingLoop(const std::string& display, Look look);
-    ~WatchingLoop();
     WatchingLoop(const WatchingLoop&) = delete;
     WatchingLoop& operator=(const WatchingLoop&) = delete;
 
@@ -35,7 +34,7 @@ private:
         int bottom = 0;
     };
 
-    void Run();
+    bool Tick();
     Area TakeDamage();
     bool Fetch(const Area& area);
 
@@ -47,6 +46,5 @@ private:
     const Look m_look;
     std::uint8_t m_damageEvent = 0;
     xcb_damage_damage_t m_damage = 0;
-    std::atomic<bool> m_ended{false};
-    std::thread m_thread; // last: it uses all the others
+    std::optional<TickingThread> m_thread; // last: it uses all the others
 };

@@ -182,16 +182,22 @@ inline std::ptrdiff_t CountThreadsOfProcess() {
                          [](const auto& task) { return !IsThreadEnding(task.path()); });
 }
 
-/// False when there are still more after PATIENCE. Fewer are all right: one that has just ended may have been
-/// counted before.
-[[nodiscard]] inline bool ThreadsComeDownTo(std::ptrdiff_t count) {
+/// Looks again and again; false when it isn't so after PATIENCE.
+template <class Condition>
+[[nodiscard]] bool YieldUntil(Condition condition) {
     const auto deadline = std::chrono::steady_clock::now() + PATIENCE;
-    while (CountThreadsOfProcess() > count) {
+    while (!condition()) {
         if (std::chrono::steady_clock::now() >= deadline)
             return false;
         std::this_thread::yield();
     }
     return true;
+}
+
+/// False when there are still more after PATIENCE. Fewer are all right: one that has just ended may have been
+/// counted before.
+[[nodiscard]] inline bool ThreadsComeDownTo(std::ptrdiff_t count) {
+    return YieldUntil([count] { return CountThreadsOfProcess() <= count; });
 }
 
 /// Whether a thread of this process has such a name, at most 15 bytes.
@@ -207,13 +213,7 @@ inline bool HasThread(const std::string& name) {
 
 /// False when there is still one after PATIENCE.
 [[nodiscard]] inline bool ThreadEnds(const std::string& name) {
-    const auto deadline = std::chrono::steady_clock::now() + PATIENCE;
-    while (HasThread(name)) {
-        if (std::chrono::steady_clock::now() >= deadline)
-            return false;
-        std::this_thread::yield();
-    }
-    return true;
+    return YieldUntil([&name] { return !HasThread(name); });
 }
 
 /// A thread that nobody joins takes a moment to end. Gives the count that it found last.
