@@ -197,6 +197,11 @@ int CShareCaptureEngine::Stop() {
         return SHARE_RESULT_FAILED;
     if (m_eSHARE_CAPTURE_ENGINE_STATUS == SHARE_CAPTURE_ENGINE_STATUS_STOPPED)
         return SHARE_RESULT_OK;
+    const ShareWait wait = WaitForCallbacks();
+    if (!wait.MayBegin()) {
+        CmTraceError("[CShareCaptureEngine::Stop]>>fail>>a callback of this engine waits for this thread");
+        return SHARE_RESULT_FAILED;
+    }
     _CleanupCapturer();
     _UpdateShareStatus(SHARE_CAPTURE_ENGINE_STATUS_STOPPED);
     m_statistic.Clear();
@@ -254,6 +259,11 @@ void CShareCaptureEngine::_UpdateShareStatus(SHARE_CAPTURE_ENGINE_STATUS status)
 }
 
 int CShareCaptureEngine::SetSink(IShareCaptureEngineSink* sink) {
+    const ShareWait wait(0, m_sinkPort);
+    if (!wait.MayBegin() && !m_sinkPort->IsCurrentThreadInside()) {
+        CmTraceError("[CShareCaptureEngine::SetSink]>>fail>>a callback of this engine waits for this thread");
+        return SHARE_RESULT_FAILED;
+    }
     const CCmMutexGuard guard(m_sinkPort->Mutex());
     if (sink != nullptr)
         _InitAssistThread();

@@ -5,6 +5,7 @@
 #include "src/share_capture_task_thread.h"
 #include "src/share_capturer_context.h"
 #include "src/share_sink_port.h"
+#include "src/share_wait.h"
 #include "util/cm_guarded_call.h"
 #include "util/cm_mutex.h"
 #include "util/cm_thread.h"
@@ -127,6 +128,9 @@ public:
     /// True when the calling thread is inside a callback of this engine's sink, or is its worker: such a
     /// thread can't wait for this engine.
     bool IsCalledFromInside() const;
+
+    /// The calling thread's wait until no callback of this engine runs any more.
+    ShareWait WaitForCallbacks() const;
 
     /// The single door to the worker. Another thread than the worker: hands `fn` over and gives 0 at once, or
     /// -1 when the worker is ending. Otherwise runs it here and gives its result.

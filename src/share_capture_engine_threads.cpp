@@ -116,6 +116,11 @@ bool CShareCaptureEngine::IsCalledFromInside() const {
     return worker != nullptr && worker->IsCurrentThread();
 }
 
+ShareWait CShareCaptureEngine::WaitForCallbacks() const {
+    const std::shared_ptr<CScreenCaptureTaskThread> worker = _GetWorker();
+    return {worker != nullptr ? worker->GetThreadId() : 0, m_sinkPort};
+}
+
 void CShareCaptureEngine::_InitAssistThread() {
     if (_GetAssistThread() != nullptr)
         return;

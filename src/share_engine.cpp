@@ -103,10 +103,12 @@ int DestroyShareCaptureEngine(IShareCaptureEngine* engine) {
         return SHARE_RESULT_INVALID_PARAM;
     CmTraceInfo("[DestroyShareCaptureEngine]>>eSHARE_CAPTURE_ENGINE_TYPE=",
                 static_cast<int>(engine->GetCaptureEngineType()));
+    // Until the engine is gone, which waits for its sink once more. The library has made it itself.
+    const ShareWait wait = static_cast<const CShareCaptureEngine*>(engine)->WaitForCallbacks();
     int result = SHARE_RESULT_FAILED;
     CmCallGuarded("[DestroyShareCaptureEngine]>>fail>>", [&] { result = engine->Stop(); });
     // Stop refuses only where it would have to wait for itself; the engine then has to live on.
-    if (result != SHARE_RESULT_OK)
+    if (result != SHARE_RESULT_OK || !wait.MayBegin())
         return SHARE_RESULT_FAILED;
     delete engine;
     return SHARE_RESULT_OK;

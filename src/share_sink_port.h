@@ -37,9 +37,10 @@ public:
     }
 
     /// True on a thread that is inside a call on this sink.
-    bool IsCurrentThreadInside() const {
-        return m_threadInside.load(std::memory_order_relaxed) == GetThreadSelfId();
-    }
+    bool IsCurrentThreadInside() const { return ThreadInside() == GetThreadSelfId(); }
+
+    /// 0 for none.
+    CmThreadId ThreadInside() const { return m_threadInside.load(std::memory_order_relaxed); }
 
     CCmMutexThreadRecursive& Mutex() { return m_mutexSink; }
 

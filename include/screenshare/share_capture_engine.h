@@ -59,9 +59,10 @@ struct SHARE_CAPTURE_STATISTIC {
 /// Threads:  OnCaptureData comes on the engine's worker, inside the pass; everything else on one assist
 ///           thread that all engines of the process share. Calls of one engine never overlap.
 /// May do:   call the engine, except Stop and DestroyShareCaptureEngine, which are refused with -1 from
-///           inside a callback of that engine: post them to another thread. Must not block on a thread that
-///           is calling Stop or SetSink of the engine. A slow sink delays its engine's frames and every
-///           engine's events.
+///           inside a callback of that engine: post them to another thread. Stop, Destroy and SetSink of
+///           another engine are refused with -1 when a callback of that one waits for this one, as they do
+///           that stop each other's engines. Must not block on a thread that is calling Stop or SetSink of
+///           the engine. A slow sink delays its engine's frames and every engine's events.
 /// Lifetime: neither owned nor counted. After SetSink(nullptr) has returned, nothing arrives any more.
 class IShareCaptureEngineSink {
 public:
@@ -102,12 +103,13 @@ public:
     /// when the worker cannot be started. May follow Stop.
     virtual int Start() = 0;
     /// Returns after the pass in progress; no frame and no event of this run follows. -1 from inside a
-    /// callback.
+    /// callback of this engine, or of one that a callback of this engine waits for.
     virtual int Stop() = 0;
     /// The worker goes on ticking and delivers nothing. -1 when stopped.
     virtual int Pause() = 0;
     virtual int Resume() = 0;
-    /// Null for none; then returns only when a running callback has ended.
+    /// Null for none; then returns only when a running callback has ended. -1 when that one waits for the
+    /// calling thread.
     virtual int SetSink(IShareCaptureEngineSink* sink) = 0;
     virtual int SetCaptureFps(unsigned fps) = 0;
     virtual int SetCaptureMaxFrameSize(unsigned width, unsigned height) = 0;

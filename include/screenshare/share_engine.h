@@ -30,7 +30,7 @@ SCREENSHARE_API void ReleaseShareLib();
 /// Builds an engine; null for a number that is no kind. End it with DestroyShareCaptureEngine.
 SCREENSHARE_API IShareCaptureEngine* CreateShareCaptureEngine(SHARE_CAPTURE_ENGINE_TYPE type);
 
-/// Stops and deletes an engine. -2 for null; -1 from inside a callback of that engine, which goes on living.
+/// Stops and deletes an engine. -2 for null; -1 where Stop is refused, and the engine goes on living.
 SCREENSHARE_API int DestroyShareCaptureEngine(IShareCaptureEngine* engine);
 
 /// Sets what holds for the whole process. Always 0; a bad argument is traced and changes nothing. `value`
