@@ -248,6 +248,9 @@ void AddX11Hints(const platform::X11Report& x11, std::vector<Hint>& hints) {
             {"A window that doesn't tell its process belongs to no application, so that keeping its "
              "application out doesn't keep it out",
              LackOf({"X-Resource", "X-Resource", x11.xres, "1.2"})});
+    if (!x11.xinput.suffices)
+        hints.push_back({"The X server is asked for the pointer with every frame, which costs CPU",
+                         LackOf({"XInput", nullptr, x11.xinput, "2.2"})});
 }
 
 std::vector<Hint> HintsOf(const DoctorFacts& facts) {

@@ -102,7 +102,7 @@ std::string ExtensionsText(const X11Report& x11) {
     return ListText({ExtensionText("Composite", x11.composite), ExtensionText("Damage", x11.damage),
                      ExtensionText("XFixes", x11.xfixes), ExtensionText("MIT-SHM", x11.shm),
                      ExtensionText("RandR", x11.randr), ExtensionText("Shape", x11.shape),
-                     ExtensionText("X-Resource", x11.xres)});
+                     ExtensionText("X-Resource", x11.xres), ExtensionText("XInput", x11.xinput)});
 }
 
 std::string OutputsText(const X11Report& x11) {

@@ -150,18 +150,19 @@ std::string X11Section(const DoctorFacts& facts) {
     if (x11.obstacle != X11Obstacle::None)
         return "\n" + heading + "\n" +
                Wrapped("It cannot be looked at: " + X11ObstacleFinding(x11).because + ".", INDENT);
-    return Section(heading,
-                   {{"Server", ServerOf(x11)},
-                    {"Screen", std::to_string(x11.width) + "x" + std::to_string(x11.height) + ", depth " +
-                                   std::to_string(x11.depth)},
-                    {"Monitors", MonitorNames(x11)},
-                    {"Window manager", NameOr(x11.hasWindowManager, x11.windowManager)},
-                    {"Compositor", NameOr(x11.hasCompositor, x11.compositor)},
-                    {"Extensions", "Composite " + VersionWords(x11.composite) + ", Damage " +
-                                       VersionWords(x11.damage) + ", XFixes " + VersionWords(x11.xfixes) +
-                                       ", MIT-SHM " + VersionWords(x11.shm) + ","},
-                    {" ", "RandR " + VersionWords(x11.randr) + ", Shape " + VersionWords(x11.shape) +
-                              ", X-Resource " + VersionWords(x11.xres)}});
+    return Section(
+        heading,
+        {{"Server", ServerOf(x11)},
+         {"Screen", std::to_string(x11.width) + "x" + std::to_string(x11.height) + ", depth " +
+                        std::to_string(x11.depth)},
+         {"Monitors", MonitorNames(x11)},
+         {"Window manager", NameOr(x11.hasWindowManager, x11.windowManager)},
+         {"Compositor", NameOr(x11.hasCompositor, x11.compositor)},
+         {"Extensions", "Composite " + VersionWords(x11.composite) + ", Damage " + VersionWords(x11.damage) +
+                            ", XFixes " + VersionWords(x11.xfixes) + ", MIT-SHM " + VersionWords(x11.shm) +
+                            ","},
+         {" ", "RandR " + VersionWords(x11.randr) + ", Shape " + VersionWords(x11.shape) + ", X-Resource " +
+                   VersionWords(x11.xres) + ", XInput " + VersionWords(x11.xinput)}});
 }
 
 /// What the library makes of the desktop. Nothing when there is none.

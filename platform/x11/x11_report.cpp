@@ -22,6 +22,7 @@
 #include <xcb/shape.h>
 #include <xcb/shm.h>
 #include <xcb/xfixes.h>
+#include <xcb/xinput.h>
 
 #include <algorithm>
 #include <cerrno>
@@ -130,6 +131,7 @@ void ReadExtensions(X11Connection& connection, X11Report& report) {
     report.xfixes = Found(connection, xcb_xfixes_id, has.xfixes);
     report.shape = Found(connection, xcb_shape_id, has.shape);
     report.xres = Found(connection, xcb_res_id, has.xres);
+    report.xinput = Found(connection, xcb_input_id, has.xinput);
     using Number = std::uint32_t;
     AskVersion<xcb_composite_query_version_reply_t>(connection, report.composite, xcb_composite_query_version,
                                                     Number{XCB_COMPOSITE_MAJOR_VERSION},
@@ -146,6 +148,8 @@ void ReadExtensions(X11Connection& connection, X11Report& report) {
                                                  Number{XCB_XFIXES_MINOR_VERSION});
     AskVersion<xcb_shape_query_version_reply_t>(connection, report.shape, xcb_shape_query_version);
     ReadResVersion(connection, report.xres);
+    AskVersion<xcb_input_xi_query_version_reply_t>(connection, report.xinput, xcb_input_xi_query_version,
+                                                   std::uint16_t{2}, std::uint16_t{2});
 }
 
 void ReadScreen(X11Connection& connection, X11Report& report) {

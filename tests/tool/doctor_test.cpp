@@ -45,6 +45,7 @@ DoctorFacts GoodFacts() {
     facts.x11.xfixes = Version(6, 0);
     facts.x11.shape = Version(1, 1);
     facts.x11.xres = Version(1, 2);
+    facts.x11.xinput = Version(2, 2);
     facts.x11.monitors = {{"DP-1", 0, 0, 1280, 720, true}};
     facts.x11.hasWindowManager = true;
     facts.x11.windowManager = "Manager";
@@ -338,6 +339,10 @@ TEST(Doctor, HintsAtWhatEachExtensionIsMissedFor) {
     facts.x11.xres = {};
     ExpectHint(facts, "keeping its application out doesn't keep it out", "no X-Resource",
                "+extension X-Resource");
+    facts = GoodFacts();
+    facts.x11.xinput = {true, 2, 0, false};
+    ExpectHint(facts, "asked for the pointer with every frame", "XInput extension is 2.0, and 2.2 is needed",
+               "newer X server");
 }
 
 TEST(Doctor, HintsAtANetworkAndNotAtMemoryThatItCannotShare) {
@@ -380,7 +385,7 @@ TEST(DoctorText, NamesWhatHasNoName) {
     facts.x11.xres = {true, 1, 0, false};
     const std::string text = DoctorText(facts, Diagnose(facts));
     EXPECT_TRUE(Has(text, "  Compositor      one without a name\n"));
-    EXPECT_TRUE(Has(text, "X-Resource 1.0 (too old)\n"));
+    EXPECT_TRUE(Has(text, "X-Resource 1.0 (too old), XInput 2.2\n"));
 }
 
 TEST(DoctorText, GivesAReasonUnderItsNoAndOnlyOnce) {
