@@ -149,46 +149,48 @@ Results InAFrameAndAnEvent(CRing& ring, const std::function<int()>& call) {
     return ring.WaitForResults(2);
 }
 
+/// All are done but one, sorted.
+Results OneRefusal(std::size_t count) {
+    Results results(count, 0);
+    results.front() = -1;
+    return results;
+}
+
 class Rings : public testing::TestWithParam<std::size_t> {};
 
 } // namespace
 
 TEST_P(Rings, OfFramesThatStopTheNextEngineAreRefusedOnce) {
     CRing ring(GetParam());
-    Results expected(GetParam(), 0);
-    expected.front() = -1;
-    EXPECT_EQ(ring.InFrames([&](std::size_t next) { return ring.Engine(next).Stop(); }), expected);
+    EXPECT_EQ(ring.InFrames([&](std::size_t next) { return ring.Engine(next).Stop(); }),
+              OneRefusal(GetParam()));
     EXPECT_EQ(ring.CountOf(SHARE_CAPTURE_ENGINE_STATUS_STARTED), 1);
     EXPECT_EQ(ring.trace.LinesContaining(STOP_REFUSED).size(), 1u);
 }
 
 TEST_P(Rings, OfCapturesThatStopTheNextEngineAreRefusedOnce) {
     CRing ring(GetParam());
-    Results expected(GetParam(), 0);
-    expected.front() = -1;
-    EXPECT_EQ(ring.InCaptures([&](std::size_t next) { return ring.Engine(next).Stop(); }), expected);
+    EXPECT_EQ(ring.InCaptures([&](std::size_t next) { return ring.Engine(next).Stop(); }),
+              OneRefusal(GetParam()));
     EXPECT_EQ(ring.CountOf(SHARE_CAPTURE_ENGINE_STATUS_STARTED), 1);
 }
 
 TEST_P(Rings, OfFramesThatDestroyTheNextEngineAreRefusedOnce) {
     CRing ring(GetParam());
-    Results expected(GetParam(), 0);
-    expected.front() = -1;
     const auto destroy = [&](std::size_t next) {
         const int result = DestroyShareCaptureEngine(&ring.Engine(next));
         if (result == 0)
             ring.Forget(next);
         return result;
     };
-    EXPECT_EQ(ring.InFrames(destroy), expected);
+    EXPECT_EQ(ring.InFrames(destroy), OneRefusal(GetParam()));
     EXPECT_EQ(ring.CountOf(SHARE_CAPTURE_ENGINE_STATUS_STARTED), 1);
 }
 
 TEST_P(Rings, OfFramesThatTakeTheNextSinkAwayAreRefusedOnce) {
     CRing ring(GetParam());
-    Results expected(GetParam(), 0);
-    expected.front() = -1;
-    EXPECT_EQ(ring.InFrames([&](std::size_t next) { return ring.Engine(next).SetSink(nullptr); }), expected);
+    EXPECT_EQ(ring.InFrames([&](std::size_t next) { return ring.Engine(next).SetSink(nullptr); }),
+              OneRefusal(GetParam()));
     EXPECT_EQ(ring.trace.LinesContaining(SET_SINK_REFUSED).size(), 1u);
 }
 
@@ -196,7 +198,7 @@ INSTANTIATE_TEST_SUITE_P(All, Rings, testing::Values(2, 3, 5));
 
 TEST(ShareCaptureEngineRing, OfAFrameAndAnEventThatStopEachOthersEnginesIsRefusedOnce) {
     CRing ring(2);
-    EXPECT_EQ(InAFrameAndAnEvent(ring, [&] { return ring.Engine(1).Stop(); }), (Results{-1, 0}));
+    EXPECT_EQ(InAFrameAndAnEvent(ring, [&] { return ring.Engine(1).Stop(); }), OneRefusal(2));
     EXPECT_EQ(ring.CountOf(SHARE_CAPTURE_ENGINE_STATUS_STARTED), 1);
 }
 
@@ -208,7 +210,7 @@ TEST(ShareCaptureEngineRing, OfAFrameThatDestroysAnEngineAndItsEventIsRefusedOnc
             ring.Forget(1);
         return result;
     };
-    EXPECT_EQ(InAFrameAndAnEvent(ring, destroy), (Results{-1, 0}));
+    EXPECT_EQ(InAFrameAndAnEvent(ring, destroy), OneRefusal(2));
     EXPECT_EQ(ring.CountOf(SHARE_CAPTURE_ENGINE_STATUS_STARTED), 1);
 }
 
@@ -218,7 +220,7 @@ TEST(ShareCaptureEngineRing, OfAStopAndASinkThatIsTakenAwayIsRefusedOnce) {
     EXPECT_EQ(ring.InFrames([&](std::size_t next) {
         return next == 0 ? ring.Engine(0).Stop() : ring.Engine(1).SetSink(nullptr);
     }),
-              (Results{-1, 0}));
+              OneRefusal(2));
 }
 
 TEST(ShareCaptureEngineRing, IsNoneWhereALineOfEnginesEndsTheNextOne) {
@@ -231,7 +233,7 @@ TEST(ShareCaptureEngineRing, IsNoneWhereALineOfEnginesEndsTheNextOne) {
 
 TEST(ShareCaptureEngineRing, IsForgottenWhenTheWaitIsOver) {
     CRing ring(2);
-    EXPECT_EQ(ring.InFrames([&](std::size_t next) { return ring.Engine(next).Stop(); }), (Results{-1, 0}));
+    EXPECT_EQ(ring.InFrames([&](std::size_t next) { return ring.Engine(next).Stop(); }), OneRefusal(2));
     EXPECT_EQ(ring.Engine(0).Stop(), 0);
     EXPECT_EQ(ring.Engine(1).Stop(), 0);
     EXPECT_EQ(ring.CountOf(SHARE_CAPTURE_ENGINE_STATUS_STOPPED), 2);
