@@ -60,7 +60,7 @@ struct X11Report {
     X11Extension xfixes;
     X11Extension shape;
     X11Extension xres;
-    X11Extension xinput; ///< Suffices when it tells of motion anywhere.
+    X11Extension xinput;              ///< Suffices when it tells of motion anywhere.
     std::vector<X11Monitor> monitors; ///< None without RandR.
     bool hasWindowManager = false;
     std::string windowManager; ///< Its name, empty when it has none; likewise the compositor's.
