@@ -57,6 +57,7 @@ struct ShareCaptureCounters {
 ///   m_mutexStatus         the status with the posting of its event.
 ///   m_mutexHandles        leaf: copies of the shared pointers to worker, assist thread and own capturer.
 /// Posting an event takes neither the sink's mutex nor the capturer's, so it is allowed under any of them.
+/// Stop and SetSink wait for callbacks of other threads, and ask a ShareWait first whether they may.
 class CShareCaptureEngine : public IShareCaptureEngine,
                             public IShareCapturerSink,
                             public ISharePointingSink,
